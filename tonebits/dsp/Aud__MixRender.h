@@ -6,8 +6,9 @@
 // (keep numQuads below 2^30). The source is always the first argument. Each
 // output sample depends only on the source and destination samples at its
 // own index as they were before the call, so src == dst (in place) is
-// allowed; any other overlap of a source with a destination, and dstA ==
-// dstB, give unspecified samples (but stay within the buffers).
+// allowed, and for MultiplyConstantAndAdd2 src may be either destination.
+// Any other overlap of a source with a destination, and dstA == dstB, give
+// unspecified samples (but stay within the buffers).
 //
 // Arithmetic is single precision with every product rounded before it is
 // added (no fused multiply-add), so results are the same bits on every CPU
