@@ -563,7 +563,7 @@ TEST(MixRender, FastSineCosine) {
     worstLength = std::max(worstLength, std::fabs(std::hypot(double(s0), double(c0)) - 1));
   }
   EXPECT_LT(worst, 0.0237);
-  EXPECT_GT(worst, 0.023);  // the approximation is the specified one, not a better one
+  EXPECT_GT(worst, 0.023);  // the documented approximation, not a better one
   EXPECT_LT(worstLength, 0.011);
 }
 
