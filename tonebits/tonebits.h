@@ -6,3 +6,5 @@
 #include "tonebits/foundation/Aud__Simd.h"
 #include "tonebits/foundation/Aud__Status.h"
 #include "tonebits/foundation/Aud__StreamBuffer.h"
+#include "tonebits/levels/Aud__DynamicLevelApplyingIterator.h"
+#include "tonebits/levels/Aud__DynamicLevelControl.h"
