@@ -185,9 +185,8 @@ struct Model {
     if (std::fabs(t - it.getTime()) < kW || i == 0) return it.level;
     const Node& p = v[i - 1];
     if (it.type == Store::StartGuard && p.type == Store::EndGuard && t < it.getTime()) return p.level;
-    const double span = it.getTime() - p.getTime();
-    if (span == 0.0) return it.level;
-    const double f = (t - p.getTime()) / span;
+    const double f = (t - p.getTime()) / (it.getTime() - p.getTime());
+    if (!std::isfinite(f)) return it.level;
     return static_cast<float>(static_cast<double>(it.level - p.level) * f) + p.level;
   }
 };

@@ -144,6 +144,16 @@ TEST(ApplyingIterator, SegmentLengthsSaturateAndNeverWrap) {
   EXPECT_EQ(b.state().level, 1.0f);
   EXPECT_EQ(b.state().nextNodeTime, 2.0);
 
+  // A span too wide for a double gives the later node's level, not NaN.
+  Store wide;
+  fill(wide, {Node(-1.7e308, 0.0f), Node(1.7e308, 1.0f)});
+  for (bool reverse : {false, true}) {
+    Stepper w(reverse);
+    w.configure(&wide, 48000, 1e308);
+    EXPECT_EQ(w.state().level, 1.0f);
+    EXPECT_EQ(w.state().samplesToNextNode, 0xFFFFFFFFu);
+  }
+
   Stepper c;
   c.configure(&s, 1000, std::numeric_limits<double>::quiet_NaN());
   EXPECT_TRUE(c.state().holdLevel || c.state().samplesToNextNode > 0);

@@ -34,36 +34,6 @@ TEST(StoreIterator, MovesStopOrWrapAtBothEnds) {
   EXPECT_NE(other.end(), s.end());
 }
 
-TEST(StoreIterator, ReadsTheNodeAndItsKind) {
-  FrameDuration fd(0.04);
-  Store s;
-  fill(s, {Node(1, .1f, SG, true), Node(2, .2f, MD, false), Node(3, .3f, EG, false), Node(4, .4f)});
-  struct Row {
-    double raw, time;
-    float level;
-    Store::eNodeType type;
-    bool black, start, end, marked, guard;
-  };
-  const Row rows[] = {{1, 1, .1f, SG, true, true, false, false, true},
-                      {2, 2, .2f, MD, false, false, false, true, false},
-                      {3, 3.01, .3f, EG, false, false, true, false, true},
-                      {4, 4, .4f, N, false, false, false, false, false}};
-  Store::iterator it = s.begin();
-  for (const Row& row : rows) {
-    SCOPED_TRACE(row.raw);
-    EXPECT_EQ(it.getRawTime(), row.raw);
-    EXPECT_DOUBLE_EQ(it.getTime(), row.time);
-    EXPECT_EQ(it.getLevel(), row.level);
-    EXPECT_EQ(it.getNodeType(), row.type);
-    EXPECT_EQ(it.isInAudioBlack(), row.black);
-    EXPECT_EQ(it.isStartGuard(), row.start);
-    EXPECT_EQ(it.isEndGuard(), row.end);
-    EXPECT_EQ(it.isMarkedForDelete(), row.marked);
-    EXPECT_EQ(it.isGuardNode(), row.guard);
-    ++it;
-  }
-}
-
 TEST(StoreIterator, SetLevelTiesTheNeighbouringGuards) {
   struct Row {
     const char* name;

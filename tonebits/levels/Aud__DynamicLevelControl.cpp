@@ -108,9 +108,10 @@ float Store::getLevelAtTime(double t) const {
   // level holds.
   if (it->type == StartGuard && p->type == EndGuard && valLessThanVal<double>(t, itTime)) return p->level;
   const double pTime = p->getTime();
-  const double span = itTime - pTime;
-  if (span == 0.0) return it->level;
-  const double f = (t - pTime) / span;
+  // Nodes acting at the same time, or so far apart that the span overflows,
+  // leave no fraction to interpolate by: the later node's level holds.
+  const double f = (t - pTime) / (itTime - pTime);
+  if (!std::isfinite(f)) return it->level;
   return static_cast<float>(static_cast<double>(it->level - p->level) * f) + p->level;
 }
 

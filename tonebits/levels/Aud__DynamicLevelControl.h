@@ -150,22 +150,39 @@ class TONEBITS_API Store {
   // automation replaces what was there.
   void insertRange(iterator first, iterator last);
 
+  // Erase one node; a start guard before the node after it takes that node's
+  // level, a guard after a Normal node takes the Normal node's. The end
+  // position is ignored.
   iterator erase(iterator it);
+  // Range erasers tie guards around the node after the range, but never a
+  // start guard that is the store's first node.
   iterator erase(iterator first, iterator last);
   // Erases the nodes with t1 <= raw time < t2; t1 > t2 (or a NaN) erases
   // and adjusts nothing.
   iterator erase(double t1, double t2);
   iterator erase_noAdjust(iterator it);
   iterator erase_noAdjust(double t1, double t2);
+  // Erases the ordinary nodes of [first, last), then re-ties every guard in
+  // the store; a section left with only its guards goes back to unity.
   iterator eraseNonGuard(iterator first, iterator last);
   // The ordinary nodes from 1e-6 s before t1 up to 1e-6 s before t2, each
   // erased with the adjusting erase(iterator); nothing unless t1 <= t2.
   iterator eraseNonGuard(double t1, double t2);
   void clear();
 
+  // Makes [min, max) of the two times audio black: its guards are flagged,
+  // its ordinary nodes erased (adjusting). Nothing happens when no node lies
+  // at or after the range's end. Holds the lock for the whole walk.
   void setRangeToBlackSection(double t1, double t2);
+  // Clears the flag of the nodes of [t1, t2), when t2 >= t1 and a node lies
+  // at or after t2.
   void setRangeToNonBlackSection(double t1, double t2);
 
+  // Linear between nodes on their acting times; the first node's level
+  // before it, the last's after it; the end guard's level in the gap before
+  // the next section's start guard; 1.0 when empty. Two nodes acting at the
+  // same time, or too far apart for the span to be finite, give the later
+  // one's level.
   float getLevelAtTime(double t) const;
   bool isInAudioBlackAtTime(double t) const;
   // level may be null; it is left alone when the result is RangeVarying.
