@@ -14,3 +14,5 @@
 #include "tonebits/foundation/Aud__Status.h"
 #include "tonebits/foundation/Aud__StreamBuffer.h"
 #include "tonebits/io/Aud__IO_Caps.h"
+#include "tonebits/levels/Aud__DynamicLevelApplyingIterator.h"
+#include "tonebits/levels/Aud__DynamicLevelControl.h"
