@@ -6,3 +6,6 @@
 #include "tonebits/foundation/Aud__Simd.h"
 #include "tonebits/foundation/Aud__Status.h"
 #include "tonebits/foundation/Aud__StreamBuffer.h"
+#include "tonebits/dsp/Aud__Biquad.h"
+#include "tonebits/dsp/Aud__MultiBandBiquad.h"
+#include "tonebits/dsp/Aud__ScopedNoDenormals.h"
