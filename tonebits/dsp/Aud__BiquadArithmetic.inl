@@ -2,72 +2,80 @@
 // once per instruction set they compile for: the one recurrence every filter
 // path runs, on a float or on a vector of floats.
 //
-// Each operation is pinned to one instruction with its operands in the
-// written order. Plain operators would let the compiler commute an addition
-// or a product, and x86 returns the first operand's NaN when both are NaN, so
-// two paths could disagree on the bits of a NaN. Pinned, every path yields the
-// same bits for every input.
+// Each operation is pinned to one instruction with its operands in a fixed
+// order. Plain operators would let the compiler commute an addition or a
+// product, and x86 returns the first source's NaN when both operands are
+// NaN, so two paths could disagree on the bits of a NaN. Pinned, every path
+// yields the same bits for every input. The rule, everywhere: a sum or
+// difference keeps its left operand's NaN, a product its signal operand's.
 //
-// The includer defines TB_INLINE and TB_VEX_OR(vex, legacy), which picks the
-// encoding of the 128-bit and scalar forms for the code around it.
+// The includer defines TB_INLINE and TB_VEX (1 where the surrounding code is
+// compiled for AVX, so that the three-operand forms are used and no legacy
+// SSE instruction meets AVX state).
+
+#if defined(__x86_64__) || defined(__i386__)
+#if TB_VEX
+// r = a op b, b possibly in memory.
+#define TB_ARITH_FORM(insn) asm("v" insn " %2, %1, %0" : "=x"(r) : "x"(a), "xm"(b));
+#else
+// r = a, then r op= b, b possibly in memory (V's alignment makes a packed
+// memory operand legal).
+#define TB_ARITH_FORM(insn) \
+  r = a;                    \
+  asm(insn " %1, %0" : "+x"(r) : "xm"(b));
+#endif
+#define TB_ARITH(ps, ss)            \
+  if constexpr (sizeof(V) == 4) {   \
+    TB_ARITH_FORM(ss)               \
+  } else {                          \
+    TB_ARITH_FORM(ps)               \
+  }
+#endif
 
 template <class V>
-TB_INLINE void addTo(V& a, const V& b) noexcept {
+TB_INLINE void sum(V& r, const V& a, const V& b) noexcept {
 #if defined(__x86_64__) || defined(__i386__)
-  if constexpr (sizeof(V) == 32)
-    asm("vaddps %1, %0, %0" : "+x"(a) : "x"(b));
-  else if constexpr (sizeof(V) == 4)
-    asm(TB_VEX_OR("vaddss %1, %0, %0", "addss %1, %0") : "+x"(a) : "x"(b));
-  else
-    asm(TB_VEX_OR("vaddps %1, %0, %0", "addps %1, %0") : "+x"(a) : "x"(b));
+  TB_ARITH("addps", "addss")
 #else
-  a = a + b;
+  r = a + b;
 #endif
 }
 
 template <class V>
-TB_INLINE void subtractFrom(V& a, const V& b) noexcept {
+TB_INLINE void difference(V& r, const V& a, const V& b) noexcept {
 #if defined(__x86_64__) || defined(__i386__)
-  if constexpr (sizeof(V) == 32)
-    asm("vsubps %1, %0, %0" : "+x"(a) : "x"(b));
-  else if constexpr (sizeof(V) == 4)
-    asm(TB_VEX_OR("vsubss %1, %0, %0", "subss %1, %0") : "+x"(a) : "x"(b));
-  else
-    asm(TB_VEX_OR("vsubps %1, %0, %0", "subps %1, %0") : "+x"(a) : "x"(b));
+  TB_ARITH("subps", "subss")
 #else
-  a = a - b;
+  r = a - b;
 #endif
 }
 
-// c * v, c first.
+// Signal a times coefficient b.
 template <class V>
-TB_INLINE void product(V& out, const V& c, const V& v) noexcept {
-  out = c;
+TB_INLINE void product(V& r, const V& a, const V& b) noexcept {
 #if defined(__x86_64__) || defined(__i386__)
-  if constexpr (sizeof(V) == 32)
-    asm("vmulps %1, %0, %0" : "+x"(out) : "x"(v));
-  else if constexpr (sizeof(V) == 4)
-    asm(TB_VEX_OR("vmulss %1, %0, %0", "mulss %1, %0") : "+x"(out) : "x"(v));
-  else
-    asm(TB_VEX_OR("vmulps %1, %0, %0", "mulps %1, %0") : "+x"(out) : "x"(v));
+  TB_ARITH("mulps", "mulss")
 #else
-  out = out * v;
+  r = a * b;
 #endif
 }
+
+#undef TB_ARITH
+#undef TB_ARITH_FORM
 
 // y = (b0*x + b1*x1) + b2*x2 - a1*y1 - a2*y2, left to right, single
 // precision, no fused multiply-add.
 template <class V>
 TB_INLINE void directFormOne(V& y, const V& b0, const V& b1, const V& b2, const V& a1, const V& a2, const V& x,
                              const V& x1, const V& x2, const V& y1, const V& y2) noexcept {
-  V term;
-  product(y, b0, x);
-  product(term, b1, x1);
-  addTo(y, term);
-  product(term, b2, x2);
-  addTo(y, term);
-  product(term, a1, y1);
-  subtractFrom(y, term);
-  product(term, a2, y2);
-  subtractFrom(y, term);
+  V term, acc;
+  product(acc, x, b0);
+  product(term, x1, b1);
+  sum(acc, acc, term);
+  product(term, x2, b2);
+  sum(acc, acc, term);
+  product(term, y1, a1);
+  difference(acc, acc, term);
+  product(term, y2, a2);
+  difference(y, acc, term);
 }

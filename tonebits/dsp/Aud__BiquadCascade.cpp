@@ -6,6 +6,10 @@
 
 #include "tonebits/foundation/Aud__Simd.h"
 
+#if defined(__SSE2__)
+#include <emmintrin.h>
+#endif
+
 namespace Aud::Filter::Private {
 
 namespace {
@@ -14,25 +18,10 @@ namespace {
 // kernel fragments, compiled for an instruction set that holds it.
 typedef float Float4 __attribute__((vector_size(16)));
 typedef float Float8 __attribute__((vector_size(32)));
-typedef int32_t Mask4 __attribute__((vector_size(16)));
-typedef int32_t Mask8 __attribute__((vector_size(32)));
 
 template <class V>
-struct Lanes;
-template <>
-struct Lanes<float> {
-  static constexpr unsigned kCount = 1;
-  using Mask = int32_t;  // one lane is never part on, part off
-};
-template <>
-struct Lanes<Float4> {
-  static constexpr unsigned kCount = 4;
-  using Mask = Mask4;
-};
-template <>
-struct Lanes<Float8> {
-  static constexpr unsigned kCount = 8;
-  using Mask = Mask8;
+struct Lanes {
+  static constexpr unsigned kCount = sizeof(V) / sizeof(float);
 };
 
 // The bands a run keeps: those active in at least one lane. A band inactive
@@ -59,9 +48,9 @@ Plan makePlan(Biquad* const* chains, unsigned lanes, unsigned nBands) noexcept {
 template <unsigned W>
 using HistoryLanes = float[4][W];
 
-// Puts the run's end state back into the bands. A band active in a lane takes
-// its whole history; an inactive one only records the last sample it passed
-// on, as processSample does.
+// Puts the run's end state back into the bands. A kept band takes its whole
+// history; a band left out only records the last sample it passed on, as
+// processSample does while inactive.
 template <unsigned W>
 void storeHistory(const HistoryLanes<W>* h, Biquad* const* chains, unsigned lanes, unsigned nBands,
                   const Plan& plan, const float* lastIn) noexcept {
@@ -69,13 +58,9 @@ void storeHistory(const HistoryLanes<W>* h, Biquad* const* chains, unsigned lane
     float passed = lastIn[l];  // the last sample that reached the current band
     unsigned i = 0;
     for (unsigned k = 0; k < nBands; ++k) {
-      Biquad& band = chains[l][k];
-      auto& history = BiquadAccess::history(band);
+      auto& history = BiquadAccess::history(chains[l][k]);
       if (i < plan.stages && plan.kept[i] == k) {
-        if (BiquadAccess::active(band))
-          history = {h[i][0][l], h[i][1][l], h[i][2][l], h[i][3][l]};
-        else
-          history.y1 = h[i][2][l];
+        history = {h[i][0][l], h[i][1][l], h[i][2][l], h[i][3][l]};
         passed = h[i][2][l];
         ++i;
       } else {
@@ -91,27 +76,20 @@ constexpr std::ptrdiff_t kChunkFrames = 256;
 #define TB_INLINE __attribute__((always_inline)) inline
 
 // The baseline instruction set: one channel, or up to four in SSE lanes.
-#if defined(__AVX__)
-#define TB_VEX_OR(vex, legacy) vex
-#else
-#define TB_VEX_OR(vex, legacy) legacy
-#endif
 namespace baseline {
+#if defined(__AVX__)
+#define TB_VEX 1
+#else
+#define TB_VEX 0
+#endif
 #include "tonebits/dsp/Aud__BiquadArithmetic.inl"
 #include "tonebits/dsp/Aud__BiquadKernel.inl"
+#undef TB_VEX
 }  // namespace baseline
-#undef TB_VEX_OR
 
-void runGroupScalar(Biquad* const* chains, unsigned nBands, const LaneBuffers& io, unsigned count) noexcept {
-  baseline::runGroup<float>(chains, 1, nBands, io, count);
-}
-void runGroup4(Biquad* const* chains, unsigned lanes, unsigned nBands, const LaneBuffers& io,
-               unsigned count) noexcept {
-  baseline::runGroup<Float4>(chains, lanes, nBands, io, count);
-}
-
-// Eight channels in AVX lanes: the fragments again, every function in them
-// compiled for AVX2.
+// The same for AVX2 machines, where the three-operand forms save a copy per
+// operation, and eight channels fit the lanes: the fragments again, every
+// function in them compiled for AVX2.
 #if defined(__x86_64__) || defined(__i386__)
 #define TB_HAS_AVX2_PATH 1
 #if defined(__clang__)
@@ -121,14 +99,22 @@ void runGroup4(Biquad* const* chains, unsigned lanes, unsigned nBands, const Lan
 #pragma GCC target("avx2")
 #endif
 namespace avx2 {
-#define TB_VEX_OR(vex, legacy) vex
+#define TB_VEX 1
 #include "tonebits/dsp/Aud__BiquadArithmetic.inl"
 #include "tonebits/dsp/Aud__BiquadKernel.inl"
-#undef TB_VEX_OR
+#undef TB_VEX
 
-void runGroup8(Biquad* const* chains, unsigned lanes, unsigned nBands, const LaneBuffers& io,
-               unsigned count) noexcept {
-  runGroup<Float8>(chains, lanes, nBands, io, count);
+void runGroup1(Biquad* const* chains, unsigned nBands, const Plan& plan, const LaneBuffers& io,
+               std::ptrdiff_t count) noexcept {
+  runGroup<float>(chains, 1, nBands, plan, io, count);
+}
+void runGroup4(Biquad* const* chains, unsigned lanes, unsigned nBands, const Plan& plan,
+               const LaneBuffers& io, std::ptrdiff_t count) noexcept {
+  runGroup<Float4>(chains, lanes, nBands, plan, io, count);
+}
+void runGroup8(Biquad* const* chains, unsigned lanes, unsigned nBands, const Plan& plan,
+               const LaneBuffers& io, std::ptrdiff_t count) noexcept {
+  runGroup<Float8>(chains, lanes, nBands, plan, io, count);
 }
 }  // namespace avx2
 #if defined(__clang__)
@@ -136,17 +122,9 @@ void runGroup8(Biquad* const* chains, unsigned lanes, unsigned nBands, const Lan
 #else
 #pragma GCC pop_options
 #endif
+#else
+#define TB_HAS_AVX2_PATH 0
 #endif
-
-// Lane l alone.
-LaneBuffers laneOf(const LaneBuffers& io, unsigned l) noexcept {
-  LaneBuffers one{};
-  one.in[0] = io.in[l];
-  one.out[0] = io.out[l];
-  one.inStride = io.inStride;
-  one.outStride = io.outStride;
-  return one;
-}
 
 // The lanes from first on.
 LaneBuffers lanesFrom(const LaneBuffers& io, unsigned first) noexcept {
@@ -158,13 +136,22 @@ LaneBuffers lanesFrom(const LaneBuffers& io, unsigned first) noexcept {
   return rest;
 }
 
-// Up to four lanes on the baseline vectors.
-void runGroupUpTo4(Biquad* const* chains, unsigned lanes, unsigned nBands, const LaneBuffers& io,
-                   unsigned count) noexcept {
-  if (lanes == 1)
-    runGroupScalar(chains, nBands, io, count);
-  else
-    runGroup4(chains, lanes, nBands, io, count);
+void runOne(Biquad* chain, unsigned nBands, const LaneBuffers& io, std::ptrdiff_t count, bool avx) noexcept {
+  const Plan plan = makePlan(&chain, 1, nBands);
+#if TB_HAS_AVX2_PATH
+  if (avx) return avx2::runGroup1(&chain, nBands, plan, io, count);
+#endif
+  (void)avx;
+  baseline::runGroup<float>(&chain, 1, nBands, plan, io, count);
+}
+
+void runUpTo4(Biquad* const* chains, unsigned lanes, unsigned nBands, const Plan& plan, const LaneBuffers& io,
+              std::ptrdiff_t count, bool avx) noexcept {
+  if (lanes == 1) return runOne(chains[0], nBands, io, count, avx);
+#if TB_HAS_AVX2_PATH
+  if (avx) return avx2::runGroup4(chains, lanes, nBands, plan, io, count);
+#endif
+  baseline::runGroup<Float4>(chains, lanes, nBands, plan, io, count);
 }
 
 }  // namespace
@@ -176,28 +163,38 @@ void runChain(Biquad* chain, unsigned nBands, const float* in, std::ptrdiff_t in
   io.out[0] = out;
   io.inStride = inStride;
   io.outStride = outStride;
-  runGroupScalar(&chain, nBands, io, count);
+  runLanes(&chain, 1, nBands, io, count);
 }
 
 void runLanes(Biquad* const* chains, unsigned lanes, unsigned nBands, const LaneBuffers& io,
               unsigned count) noexcept {
   if (count == 0 || lanes == 0) return;
+  const Simd::eLevel level = Simd::activeLevel();
+  const bool avx = level >= Simd::eAVX2;
+  const Plan plan = makePlan(chains, lanes, nBands);
   bool repeated = false;
   for (unsigned l = 1; l < lanes; ++l)
     for (unsigned m = 0; m < l; ++m) repeated = repeated || chains[l] == chains[m];
-  const Simd::eLevel level = Simd::activeLevel();
-  if (repeated || level == Simd::eScalar) {
-    // One lane after another: a chain that serves two lanes must see the
-    // second lane's samples after the first's.
-    for (unsigned l = 0; l < lanes; ++l) runGroupScalar(&chains[l], nBands, laneOf(io, l), count);
+  if (lanes == 1 || repeated || plan.mixed || level == Simd::eScalar) {
+    // One lane after another. A chain that serves two lanes must see the
+    // second lane's samples after the first's; and lanes whose bands differ
+    // in which are on do not share a pipeline.
+    for (unsigned l = 0; l < lanes; ++l) {
+      LaneBuffers one{};
+      one.in[0] = io.in[l];
+      one.out[0] = io.out[l];
+      one.inStride = io.inStride;
+      one.outStride = io.outStride;
+      runOne(chains[l], nBands, one, count, avx);
+    }
     return;
   }
 #if TB_HAS_AVX2_PATH
-  if (lanes > 4 && level >= Simd::eAVX2) return avx2::runGroup8(chains, lanes, nBands, io, count);
+  if (lanes > 4 && avx) return avx2::runGroup8(chains, lanes, nBands, plan, io, count);
 #endif
-  if (lanes <= 4) return runGroupUpTo4(chains, lanes, nBands, io, count);
-  runGroup4(chains, 4, nBands, io, count);
-  runGroupUpTo4(chains + 4, lanes - 4, nBands, lanesFrom(io, 4), count);
+  if (lanes <= 4) return runUpTo4(chains, lanes, nBands, plan, io, count, avx);
+  runUpTo4(chains, 4, nBands, plan, io, count, avx);
+  runUpTo4(chains + 4, lanes - 4, nBands, plan, lanesFrom(io, 4), count, avx);
 }
 
 }  // namespace Aud::Filter::Private

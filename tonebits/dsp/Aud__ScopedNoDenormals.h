@@ -15,6 +15,8 @@
 // made, so scopes nest. The mode belongs to the thread: make and destroy the
 // object on the same thread, around the calls to be protected (the library's
 // own calls; the compiler may move inline arithmetic across the switch).
+// Threads started inside the scope inherit the mode with the rest of the
+// floating-point environment.
 // On CPUs without these modes the object does nothing.
 #pragma once
 
