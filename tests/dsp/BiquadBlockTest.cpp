@@ -218,15 +218,19 @@ void checkChannelsEverywhere(uint32_t seed) {
   for (Aud::Simd::eLevel level : levels()) {
     Aud::Simd::setActiveLevel(level);
     for (unsigned channels : {1u, 2u, 3u, 4u, 5u, 6u, 7u, 8u, 11u})
-      for (unsigned n : {0u, 1u, 2u, 3u, 7u, 64u, 257u, 600u})
-        for (Layout layout : layouts) {
-          SCOPED_TRACE(testing::Message() << Aud::Simd::levelName(level) << " channels " << channels << " n "
-                                          << n << " layout " << int(layout));
-          const Salt salt = kSalts[rng() % std::size(kSalts)];
-          checkChannels<F>(rng, channels, n, layout, salt, false);
-          checkChannels<F>(rng, channels, n, layout, salt, true);
-          if (testing::Test::HasFatalFailure()) return;
+      for (Layout layout : layouts) {
+        SCOPED_TRACE(testing::Message()
+                     << Aud::Simd::levelName(level) << " channels " << channels << " layout " << int(layout));
+        // Same bands on in every channel: the lanes run together (lengths
+        // around the pipeline's fill and the gather chunk).
+        for (unsigned n : {0u, 1u, 2u, 5u, 64u, 300u}) {
+          SCOPED_TRACE(n);
+          checkChannels<F>(rng, channels, n, layout, kSalts[rng() % std::size(kSalts)], true);
         }
+        // Bands on in some channels only: lane after lane.
+        checkChannels<F>(rng, channels, 64, layout, kSalts[rng() % std::size(kSalts)], false);
+        if (testing::Test::HasFatalFailure()) return;
+      }
   }
 }
 

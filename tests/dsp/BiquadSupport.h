@@ -105,8 +105,11 @@ inline std::vector<float> signal(unsigned count, Salt salt, std::mt19937& rng) {
       for (float& x : v) x *= 1e-39f;  // every sample denormal, results too
       break;
     case Salt::kNaN:
-      v[at] = floatOf(0x7FC01234u);  // a quiet NaN with a payload
+      // Quiet NaNs of both signs with payloads, and a signalling one: where
+      // two meet, the result's bits depend on the operand order.
+      v[at] = floatOf(0x7FC01234u);
       if (count > 3) v[(at + count / 2) % count] = floatOf(0xFFC00000u);
+      if (count > 5) v[(at + count / 3) % count] = floatOf(0x7F800001u);
       break;
     case Salt::kInfinity: v[at] = (rng() % 2) ? INFINITY : -INFINITY; break;
     case Salt::kNegativeZero:

@@ -25,14 +25,16 @@ constexpr int32_t kLineResponseUnconfigured = 385;
   throw Kv::Exception::RuntimeError(message, kSource, line);
 }
 
+// The recurrence, shared with the block paths so that every path rounds and
+// propagates NaNs alike.
 #define TB_INLINE __attribute__((always_inline)) inline
 #if defined(__AVX__)
-#define TB_VEX_OR(vex, legacy) vex
+#define TB_VEX 1
 #else
-#define TB_VEX_OR(vex, legacy) legacy
+#define TB_VEX 0
 #endif
 #include "tonebits/dsp/Aud__BiquadArithmetic.inl"
-#undef TB_VEX_OR
+#undef TB_VEX
 
 using Shape = Biquad::ShapeDescriptor;
 
