@@ -113,21 +113,6 @@ TEST(BiquadDesign, PublishedLowPassExample) {
   EXPECT_NEAR(b.getResponseMagnitudeAtFrequency(1.0f), 0.0f, 1e-6);
 }
 
-TEST(BiquadDesign, ShapeDescriptorSettersPairKindAndValue) {
-  Shape s;
-  EXPECT_EQ(s.getType(), Shape::NoShape);
-  EXPECT_EQ(s.getValue(), 0.0f);
-  s.setAsBandwidth(1.5f);
-  EXPECT_EQ(s.getType(), Shape::Bandwidth);
-  EXPECT_EQ(s.getValue(), 1.5f);
-  s.setAsQ(0.5f);
-  EXPECT_EQ(s.getType(), Shape::Q);
-  s.setAsS(0.25f);
-  EXPECT_EQ(s.getType(), Shape::S);
-  EXPECT_EQ(s.getValue(), 0.25f);
-  static_assert(sizeof(Biquad::eFilterType) == 4 && sizeof(Shape::eType) == 4);
-}
-
 // ---- Throws ----
 
 struct ThrowCase {

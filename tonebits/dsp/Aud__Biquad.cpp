@@ -162,14 +162,24 @@ void Biquad::processBlock(const float* in, float* out, unsigned count) noexcept 
 
 void Biquad::processBlockMultiChannel(Biquad* const* filters, const float* const* in, float* const* out,
                                       unsigned channels, unsigned count) noexcept {
-  Private::runChannels(
-      filters, [](Biquad* f) { return f; }, 1, channels, in, out, count);
+  const auto chainOf = [](Biquad* f) { return f; };
+  Private::ChannelForms<Biquad, decltype(chainOf)>::strided(filters, chainOf, 1, in, 1, out, 1, channels,
+                                                            count);
+}
+
+void Biquad::processBlockStrided(Biquad* const* filters, const float* const* in, std::ptrdiff_t inStride,
+                                 float* const* out, std::ptrdiff_t outStride, unsigned channels,
+                                 unsigned count) noexcept {
+  const auto chainOf = [](Biquad* f) { return f; };
+  Private::ChannelForms<Biquad, decltype(chainOf)>::strided(filters, chainOf, 1, in, inStride, out, outStride,
+                                                            channels, count);
 }
 
 void Biquad::processBlockInterleaved(Biquad* const* filters, const float* in, float* out, unsigned channels,
                                      unsigned frames) noexcept {
-  Private::runInterleaved(
-      filters, [](Biquad* f) { return f; }, 1, channels, in, out, frames);
+  const auto chainOf = [](Biquad* f) { return f; };
+  Private::ChannelForms<Biquad, decltype(chainOf)>::interleaved(filters, chainOf, 1, in, out, channels,
+                                                                frames);
 }
 
 float Biquad::getResponseMagnitudeAtFrequency(float f) const {

@@ -26,6 +26,7 @@
 // A filter belongs to one caller at a time.
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 
 #include "tonebits/export.h"
@@ -99,19 +100,27 @@ class TONEBITS_API Biquad {
   // in == out is allowed; otherwise the buffers must not overlap.
   void processBlock(const float* in, float* out, unsigned count) noexcept;
 
-  // Runs filters[c] over channel c for every channel at once, one channel
-  // per SIMD lane where the CPU allows, with exactly the bits of
-  // filters[c]->processBlock(in[c], out[c], count) for each c. The filters
-  // may be configured differently; a filter that appears more than once is
-  // run channel after channel, as the per-channel calls would. in[c] == out[c]
-  // is allowed; otherwise no buffers may overlap.
+  // Several channels at once: filters[c] runs over channel c, with exactly
+  // the bits of running each channel through its own filter with
+  // processBlock. Channels whose filters are switched on alike share SIMD
+  // lanes (four or eight at a time, as the CPU allows); the others, and a
+  // filter listed twice, run one channel after another, in channel order.
+  // In place is allowed; otherwise no buffers may overlap. A null list,
+  // filter or buffer, or a stride below 1, is reported through vel_splat and
+  // nothing is touched (nothing is checked when there is nothing to do).
+  //
+  // Planar: channel c's count samples are in[c][0 .. count) and go to out[c].
   static void processBlockMultiChannel(Biquad* const* filters, const float* const* in, float* const* out,
                                        unsigned channels, unsigned count) noexcept;
-  // The same over interleaved frames: channel c of frame n is at
-  // [n * channels + c] of in and out, which hold frames * channels samples.
-  // in == out is allowed.
+  // Interleaved frames: channel c of frame n is at [n * channels + c] of in
+  // and out, which hold frames * channels samples.
   static void processBlockInterleaved(Biquad* const* filters, const float* in, float* out, unsigned channels,
                                       unsigned frames) noexcept;
+  // Any layout, e.g. planar in and interleaved out: channel c's sample n is
+  // read from in[c][n * inStride] and written to out[c][n * outStride].
+  static void processBlockStrided(Biquad* const* filters, const float* const* in, std::ptrdiff_t inStride,
+                                  float* const* out, std::ptrdiff_t outStride, unsigned channels,
+                                  unsigned count) noexcept;
 
   // The last output (the last input while inactive).
   float getLastProcessSampleResult() const noexcept { return history.y1; }

@@ -53,50 +53,53 @@ void runChain(Biquad* chain, unsigned nBands, const float* in, std::ptrdiff_t in
 void runLanes(Biquad* const* chains, unsigned lanes, unsigned nBands, const LaneBuffers& io,
               unsigned count) noexcept;
 
-// The public multichannel forms: check the arguments, then feed the channels
-// to runLanes a group at a time, in channel order. chainOf(filter) is the
-// filter's first band.
-template <class Filter, class ChainOf>
-void runChannels(Filter* const* filters, ChainOf chainOf, unsigned nBands, unsigned channels,
-                 const float* const* in, float* const* out, unsigned count) noexcept {
+// The public multichannel forms. Channel c's sample n is read from
+// inOf(c)[n * inStride] and written to outOf(c)[n * outStride];
+// chainOf(filter) is a filter's first band. The arguments are checked (a bad
+// one is reported and nothing is touched), then the channels go to runLanes
+// a group at a time, in channel order.
+template <class Filter, class ChainOf, class InOf, class OutOf>
+void runChannels(Filter* const* filters, ChainOf chainOf, unsigned nBands, unsigned channels, InOf inOf,
+                 std::ptrdiff_t inStride, OutOf outOf, std::ptrdiff_t outStride, unsigned count) noexcept {
   if (channels == 0 || count == 0) return;
-  if (!filters || !in || !out) return vel_splat("Aud::Filter: null filter or buffer list");
+  if (!filters) return vel_splat("Aud::Filter: null filter list");
+  if (inStride < 1 || outStride < 1) return vel_splat("Aud::Filter: sample stride below 1");
   for (unsigned c = 0; c < channels; ++c)
-    if (!filters[c] || !in[c] || !out[c]) return vel_splat("Aud::Filter: null filter or channel buffer");
+    if (!filters[c] || !inOf(c) || !outOf(c)) return vel_splat("Aud::Filter: null filter or channel buffer");
   for (unsigned first = 0; first < channels; first += kMaxLanes) {
     const unsigned lanes = channels - first < kMaxLanes ? channels - first : kMaxLanes;
     Biquad* chains[kMaxLanes];
     LaneBuffers io{};
-    io.inStride = io.outStride = 1;
+    io.inStride = inStride;
+    io.outStride = outStride;
     for (unsigned l = 0; l < lanes; ++l) {
       chains[l] = chainOf(filters[first + l]);
-      io.in[l] = in[first + l];
-      io.out[l] = out[first + l];
+      io.in[l] = inOf(first + l);
+      io.out[l] = outOf(first + l);
     }
     runLanes(chains, lanes, nBands, io, count);
   }
 }
 
+// The three public forms over one kind of filter.
 template <class Filter, class ChainOf>
-void runInterleaved(Filter* const* filters, ChainOf chainOf, unsigned nBands, unsigned channels,
-                    const float* in, float* out, unsigned frames) noexcept {
-  if (channels == 0 || frames == 0) return;
-  if (!filters || !in || !out) return vel_splat("Aud::Filter: null filter list or buffer");
-  for (unsigned c = 0; c < channels; ++c)
-    if (!filters[c]) return vel_splat("Aud::Filter: null filter");
-  for (unsigned first = 0; first < channels; first += kMaxLanes) {
-    const unsigned lanes = channels - first < kMaxLanes ? channels - first : kMaxLanes;
-    Biquad* chains[kMaxLanes];
-    LaneBuffers io{};
-    io.inStride = io.outStride = std::ptrdiff_t(channels);
-    for (unsigned l = 0; l < lanes; ++l) {
-      chains[l] = chainOf(filters[first + l]);
-      io.in[l] = in + first + l;
-      io.out[l] = out + first + l;
-    }
-    runLanes(chains, lanes, nBands, io, frames);
+struct ChannelForms {
+  static void strided(Filter* const* filters, ChainOf chainOf, unsigned nBands, const float* const* in,
+                      std::ptrdiff_t inStride, float* const* out, std::ptrdiff_t outStride, unsigned channels,
+                      unsigned count) noexcept {
+    if (channels && count && (!in || !out)) return vel_splat("Aud::Filter: null buffer list");
+    runChannels(
+        filters, chainOf, nBands, channels, [&](unsigned c) { return in[c]; }, inStride,
+        [&](unsigned c) { return out[c]; }, outStride, count);
   }
-}
+  static void interleaved(Filter* const* filters, ChainOf chainOf, unsigned nBands, const float* in,
+                          float* out, unsigned channels, unsigned frames) noexcept {
+    if (channels && frames && (!in || !out)) return vel_splat("Aud::Filter: null buffer");
+    runChannels(
+        filters, chainOf, nBands, channels, [&](unsigned c) { return in + c; }, std::ptrdiff_t(channels),
+        [&](unsigned c) { return out + c; }, std::ptrdiff_t(channels), frames);
+  }
+};
 
 }  // namespace Private
 }  // namespace Aud::Filter

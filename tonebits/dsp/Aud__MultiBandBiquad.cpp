@@ -44,15 +44,27 @@ template <unsigned N>
 void MultiBandBiquad<N>::processBlockMultiChannel(MultiBandBiquad* const* filters, const float* const* in,
                                                   float* const* out, unsigned channels,
                                                   unsigned count) noexcept {
-  Private::runChannels(
-      filters, [](MultiBandBiquad* f) { return f->bands; }, N, channels, in, out, count);
+  const auto chainOf = [](MultiBandBiquad* f) { return f->bands; };
+  Private::ChannelForms<MultiBandBiquad, decltype(chainOf)>::strided(filters, chainOf, N, in, 1, out, 1,
+                                                                     channels, count);
+}
+
+template <unsigned N>
+void MultiBandBiquad<N>::processBlockStrided(MultiBandBiquad* const* filters, const float* const* in,
+                                             std::ptrdiff_t inStride, float* const* out,
+                                             std::ptrdiff_t outStride, unsigned channels,
+                                             unsigned count) noexcept {
+  const auto chainOf = [](MultiBandBiquad* f) { return f->bands; };
+  Private::ChannelForms<MultiBandBiquad, decltype(chainOf)>::strided(filters, chainOf, N, in, inStride, out,
+                                                                     outStride, channels, count);
 }
 
 template <unsigned N>
 void MultiBandBiquad<N>::processBlockInterleaved(MultiBandBiquad* const* filters, const float* in, float* out,
                                                  unsigned channels, unsigned frames) noexcept {
-  Private::runInterleaved(
-      filters, [](MultiBandBiquad* f) { return f->bands; }, N, channels, in, out, frames);
+  const auto chainOf = [](MultiBandBiquad* f) { return f->bands; };
+  Private::ChannelForms<MultiBandBiquad, decltype(chainOf)>::interleaved(filters, chainOf, N, in, out,
+                                                                         channels, frames);
 }
 
 template <unsigned N>

@@ -10,13 +10,15 @@
 // processBlock() gives exactly the bits of calling processSample() once per
 // sample. It overlaps the bands' recursions (band k works on sample n while
 // band k + 1 works on sample n - 1), which the arithmetic order allows.
-// processBlockMultiChannel() and processBlockInterleaved() run one chain per
-// channel, several channels at once in SIMD lanes, with the same bits.
+// The multichannel forms run one chain per channel, several channels at once
+// in SIMD lanes, with the same bits.
 //
 // Errors: getBand() with an index of N or more and the response of a chain
 // with an active unconfigured band throw Kv::Exception::RuntimeError. A chain
 // belongs to one caller at a time.
 #pragma once
+
+#include <cstddef>
 
 #include "tonebits/dsp/Aud__Biquad.h"
 #include "tonebits/export.h"
@@ -41,18 +43,18 @@ class TONEBITS_API MultiBandBiquad {
   // allowed; otherwise the buffers must not overlap.
   void processBlock(const float* in, float* out, unsigned count) noexcept;
 
-  // filters[c] over channel c for every channel, with exactly the bits of
-  // filters[c]->processBlock(in[c], out[c], count) for each c, several
-  // channels per SIMD lane group. in[c] == out[c] is allowed; otherwise no
-  // buffers may overlap. A filter listed twice runs channel after channel.
-  // A null list, filter or buffer (with samples to process) is reported
-  // through vel_splat and nothing is touched.
+  // Several channels at once, each through its own chain, as for
+  // Biquad::processBlockMultiChannel and its siblings: exactly the bits of
+  // filters[c]->processBlock on each channel; channels whose bands are
+  // switched on alike share SIMD lanes. A stereo equaliser on interleaved
+  // frames runs in place in the lanes.
   static void processBlockMultiChannel(MultiBandBiquad* const* filters, const float* const* in,
                                        float* const* out, unsigned channels, unsigned count) noexcept;
-  // The same over interleaved frames: channel c of frame n is at
-  // [n * channels + c]. in == out is allowed.
   static void processBlockInterleaved(MultiBandBiquad* const* filters, const float* in, float* out,
                                       unsigned channels, unsigned frames) noexcept;
+  static void processBlockStrided(MultiBandBiquad* const* filters, const float* const* in,
+                                  std::ptrdiff_t inStride, float* const* out, std::ptrdiff_t outStride,
+                                  unsigned channels, unsigned count) noexcept;
 
   // Zeroes every band's history.
   void reset() noexcept;
