@@ -24,11 +24,11 @@
   r = a;                    \
   asm(insn " %1, %0" : "+x"(r) : "xm"(b));
 #endif
-#define TB_ARITH(ps, ss)            \
-  if constexpr (sizeof(V) == 4) {   \
-    TB_ARITH_FORM(ss)               \
-  } else {                          \
-    TB_ARITH_FORM(ps)               \
+#define TB_ARITH(ps, ss)          \
+  if constexpr (sizeof(V) == 4) { \
+    TB_ARITH_FORM(ss)             \
+  } else {                        \
+    TB_ARITH_FORM(ps)             \
   }
 #endif
 
@@ -66,8 +66,8 @@ TB_INLINE void product(V& r, const V& a, const V& b) noexcept {
 // y = (b0*x + b1*x1) + b2*x2 - a1*y1 - a2*y2, left to right, single
 // precision, no fused multiply-add.
 template <class V>
-TB_INLINE void directFormOne(V& y, const V& b0, const V& b1, const V& b2, const V& a1, const V& a2, const V& x,
-                             const V& x1, const V& x2, const V& y1, const V& y2) noexcept {
+TB_INLINE void directFormOne(V& y, const V& b0, const V& b1, const V& b2, const V& a1, const V& a2,
+                             const V& x, const V& x1, const V& x2, const V& y1, const V& y2) noexcept {
   V term, acc;
   product(acc, x, b0);
   product(term, x1, b1);

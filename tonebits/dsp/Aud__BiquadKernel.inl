@@ -43,7 +43,9 @@ struct Contiguous {
   float* out;
   std::ptrdiff_t inStride, outStride;
   TB_INLINE void load(V& v, std::ptrdiff_t t) const noexcept { loadFrame<V, F>(v, in + t * inStride); }
-  TB_INLINE void store(std::ptrdiff_t t, const V& v) const noexcept { storeFrame<V, F>(out + t * outStride, v); }
+  TB_INLINE void store(std::ptrdiff_t t, const V& v) const noexcept {
+    storeFrame<V, F>(out + t * outStride, v);
+  }
 };
 
 #if defined(__SSE2__)
@@ -74,7 +76,8 @@ struct Stage {
 // for the first stage, else the previous stage's last output, which the
 // caller has not replaced yet (stages go last first).
 template <class V, class Frames>
-TB_INLINE void stageStep(Stage<V>* stages, unsigned k, unsigned m, const Frames& io, std::ptrdiff_t t) noexcept {
+TB_INLINE void stageStep(Stage<V>* stages, unsigned k, unsigned m, const Frames& io,
+                         std::ptrdiff_t t) noexcept {
   Stage<V>& st = stages[k];
   V x, y;
   if (k == 0)
@@ -92,8 +95,9 @@ TB_INLINE void stageStep(Stage<V>* stages, unsigned k, unsigned m, const Frames&
 // Steps [begin, end) while the pipeline fills or drains: only the stages
 // that have a frame run. Few steps per call, so the state stays in memory.
 template <class V, class Frames>
-__attribute__((noinline)) void partialSteps(Stage<V>* stages, unsigned m, const Frames& io, std::ptrdiff_t begin,
-                                            std::ptrdiff_t end, std::ptrdiff_t count) noexcept {
+__attribute__((noinline)) void partialSteps(Stage<V>* stages, unsigned m, const Frames& io,
+                                            std::ptrdiff_t begin, std::ptrdiff_t end,
+                                            std::ptrdiff_t count) noexcept {
   for (std::ptrdiff_t t = begin; t < end; ++t)
     for (unsigned k = m; k-- > 0;)
       if (t - std::ptrdiff_t(k) >= 0 && t - std::ptrdiff_t(k) < count) stageStep<V>(stages, k, m, io, t);
@@ -110,7 +114,8 @@ __attribute__((noinline)) void fullSteps(Stage<V>* stages, const Frames& frames,
   const auto step = [&](std::ptrdiff_t t) __attribute__((always_inline)) {
     [&]<unsigned... I>(std::integer_sequence<unsigned, I...>) __attribute__((always_inline)) {
       (stageStep<V>(s, M - 1 - I, M, io, t), ...);
-    }(std::make_integer_sequence<unsigned, M>());
+    }
+    (std::make_integer_sequence<unsigned, M>());
   };
   std::ptrdiff_t t = begin;
   for (; t + 1 < end; t += 2) {  // two steps a turn: the history rotates through registers without copies
@@ -189,7 +194,8 @@ void runGroup(Biquad* const* chains, unsigned lanes, unsigned nBands, const Plan
   Stage<V> stages[kMaxBands];
   loadStages(stages, chains, lanes, plan);
   bool adjacent = io.inStride == std::ptrdiff_t(lanes) && io.outStride == std::ptrdiff_t(lanes);
-  for (unsigned l = 1; adjacent && l < lanes; ++l) adjacent = io.in[l] == io.in[0] + l && io.out[l] == io.out[0] + l;
+  for (unsigned l = 1; adjacent && l < lanes; ++l)
+    adjacent = io.in[l] == io.in[0] + l && io.out[l] == io.out[0] + l;
   const std::ptrdiff_t inStride = io.inStride, outStride = io.outStride;
   bool done = false;
   if constexpr (W == 1) {
@@ -205,7 +211,8 @@ void runGroup(Biquad* const* chains, unsigned lanes, unsigned nBands, const Plan
       if (adjacent)
         runStages(stages, plan.stages, Contiguous<V, 2>{io.in[0], io.out[0], inStride, outStride}, count);
       else
-        runStages(stages, plan.stages, Pair<V>{io.in[0], io.in[1], io.out[0], io.out[1], inStride, outStride}, count);
+        runStages(stages, plan.stages, Pair<V>{io.in[0], io.in[1], io.out[0], io.out[1], inStride, outStride},
+                  count);
       done = true;
     }
   }
@@ -216,7 +223,8 @@ void runGroup(Biquad* const* chains, unsigned lanes, unsigned nBands, const Plan
     for (std::ptrdiff_t first = 0; first < count; first += kChunkFrames) {
       const std::ptrdiff_t n = count - first < kChunkFrames ? count - first : kChunkFrames;
       for (std::ptrdiff_t f = 0; f < n; ++f)
-        for (unsigned l = 0; l < W; ++l) frames[f * W + l] = l < lanes ? io.in[l][(first + f) * inStride] : 0.0f;
+        for (unsigned l = 0; l < W; ++l)
+          frames[f * W + l] = l < lanes ? io.in[l][(first + f) * inStride] : 0.0f;
       runStages(stages, plan.stages, scratch, n);
       for (unsigned l = 0; l < lanes; ++l)
         for (std::ptrdiff_t f = 0; f < n; ++f) io.out[l][(first + f) * outStride] = frames[f * W + l];
