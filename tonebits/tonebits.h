@@ -1,8 +1,11 @@
 // Every public header of the tonebits library.
 #pragma once
 
+#include "tonebits/dsp/Aud__Biquad.h"
 #include "tonebits/dsp/Aud__GainCurve.h"
 #include "tonebits/dsp/Aud__MixRender.h"
+#include "tonebits/dsp/Aud__MultiBandBiquad.h"
+#include "tonebits/dsp/Aud__ScopedNoDenormals.h"
 #include "tonebits/export.h"
 #include "tonebits/foundation/Aud__AudioPreferences.h"
 #include "tonebits/foundation/Aud__FrameCadence.h"
