@@ -3,6 +3,7 @@
 
 #include "tonebits/export.h"
 #include "tonebits/foundation/Aud__SampleConversion.h"
+#include "tonebits/dsp/Aud__GainCurve.h"
 #include "tonebits/foundation/Aud__Simd.h"
 #include "tonebits/foundation/Aud__Status.h"
 #include "tonebits/foundation/Aud__StreamBuffer.h"
