@@ -7,3 +7,4 @@
 #include "tonebits/foundation/Aud__Simd.h"
 #include "tonebits/foundation/Aud__Status.h"
 #include "tonebits/foundation/Aud__StreamBuffer.h"
+#include "tonebits/mixer/Aud__SimpleMixState.h"
