@@ -24,6 +24,7 @@
 #pragma once
 
 #include <cstddef>
+#include <deque>
 #include <map>
 #include <string_view>
 #include <vector>
@@ -69,7 +70,8 @@ class HOST_API KvIniFile {
   KvIniFile(const KvIniFile&);
   KvIniFile& operator=(const KvIniFile&);
 
-  // The section's pairs, made empty when there is no such section yet.
+  // The section's pairs, made empty when there is no such section yet. The
+  // reference stays good while other sections are added.
   Pairs& operator[](const String& section);
   // The section's pairs; an empty list when there is no such section.
   const Pairs& operator[](const String& section) const;
@@ -95,7 +97,9 @@ class HOST_API KvIniFile {
     String name;
     Pairs pairs;
   };
-  using Sections = std::vector<Section, StdAllocator<Section>>;
+  // A deque, so that adding a section never moves the others: a reference
+  // to a section's pairs stays good until clear, parse or load.
+  using Sections = std::deque<Section, StdAllocator<Section>>;
   using Index = std::map<NarrowString, std::size_t, std::less<>,
                          StdAllocator<std::pair<const NarrowString, std::size_t>>>;
 
