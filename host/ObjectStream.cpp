@@ -131,7 +131,10 @@ bool StreamFile::open(const char* path, eOpenMode mode) {
 bool StreamFile::flush() { return backing_->flush(); }
 
 bool StreamFile::close() {
-  const bool ok = backing_->flush() & backing_->close();
+  // Close even when the flush failed, so the file is never left open.
+  const bool flushed = backing_->flush();
+  const bool closed = backing_->close();
+  const bool ok = flushed && closed;
   if (backing_->isFile()) backing_.reset(new MemoryBacking);
   position_ = 0;
   return ok;
