@@ -18,7 +18,12 @@ std::string_view trim(std::string_view s) {
   return s;
 }
 
-bool hasLineBreak(std::string_view s) { return s.find_first_of("\r\n") != std::string_view::npos; }
+bool hasLineBreak(std::string_view s) {
+  for (char c : s) {
+    if (c == '\n' || c == '\r') return true;
+  }
+  return false;
+}
 
 }  // namespace
 

@@ -21,19 +21,33 @@ struct StreamFile::Backing : host::HostAllocated {
   virtual Bytes contents() = 0;
 };
 
+// A growable block on the host heap. Grown by doubling, and without zero-
+// filling what a write is about to cover: packing writes a few bytes at a
+// time at the end.
 struct StreamFile::MemoryBacking final : Backing {
-  Bytes data;
+  unsigned char* data = nullptr;
+  std::size_t bytes = 0;
+  std::size_t capacity = 0;
 
-  std::size_t size() const noexcept override { return data.size(); }
-  void read(std::size_t at, void* out, std::size_t length) override {
-    std::memcpy(out, data.data() + at, length);
+  ~MemoryBacking() override { OS()->allocator()->release(data); }
+  void reserve(std::size_t wanted) {
+    if (wanted <= capacity) return;
+    const std::size_t grown = std::max<std::size_t>({wanted, capacity * 2, 256});
+    auto* bigger = static_cast<unsigned char*>(host::allocateOrThrow(grown));
+    if (bytes) std::memcpy(bigger, data, bytes);
+    OS()->allocator()->release(data);
+    data = bigger;
+    capacity = grown;
   }
+  std::size_t size() const noexcept override { return bytes; }
+  void read(std::size_t at, void* out, std::size_t length) override { std::memcpy(out, data + at, length); }
   bool write(std::size_t at, const void* in, std::size_t length) override {
-    if (at + length > data.size()) data.resize(at + length);
-    std::memcpy(data.data() + at, in, length);
+    reserve(at + length);
+    std::memcpy(data + at, in, length);
+    bytes = std::max(bytes, at + length);
     return true;
   }
-  Bytes contents() override { return data; }
+  Bytes contents() override { return Bytes(data, data + bytes); }
 };
 
 struct StreamFile::FileBacking final : Backing {
@@ -95,19 +109,23 @@ struct StreamFile::FileBacking final : Backing {
   }
 };
 
-StreamFile::StreamFile() : backing_(new MemoryBacking) {}
+StreamFile::StreamFile() : backing_(new MemoryBacking) {
+  memory_ = static_cast<MemoryBacking*>(backing_.get());
+}
 
 StreamFile::StreamFile(const void* bytes, std::size_t length) : StreamFile() {
   if (length > kMaxData) length = kMaxData;
-  auto& data = static_cast<MemoryBacking&>(*backing_).data;
-  if (length)
-    data.assign(static_cast<const unsigned char*>(bytes), static_cast<const unsigned char*>(bytes) + length);
+  if (length) memory_->write(0, bytes, length);
 }
 
 StreamFile::~StreamFile() = default;
 
 bool StreamFile::open(const char* path, eOpenMode mode) {
   close();
+  backing_.reset(new MemoryBacking);
+  memory_ = static_cast<MemoryBacking*>(backing_.get());
+  shortfall_ = 0;
+  writeFailed_ = false;
   const char* how = mode == eReadOnly ? "rb" : mode == eCreate ? "w+b" : "r+b";
   std::FILE* file = path ? std::fopen(path, how) : nullptr;
   if (!file) return false;
@@ -118,6 +136,7 @@ bool StreamFile::open(const char* path, eOpenMode mode) {
     return false;
   }
   std::unique_ptr<FileBacking> backing(new FileBacking);
+  memory_ = nullptr;
   backing->file = file;
   backing->bytes = static_cast<std::size_t>(end);
   backing->writable = mode != eReadOnly;
@@ -135,14 +154,19 @@ bool StreamFile::close() {
   const bool flushed = backing_->flush();
   const bool closed = backing_->close();
   const bool ok = flushed && closed;
-  if (backing_->isFile()) backing_.reset(new MemoryBacking);
+  if (backing_->isFile()) {
+    backing_.reset(new MemoryBacking);
+    memory_ = static_cast<MemoryBacking*>(backing_.get());
+  }
   position_ = 0;
   return ok;
 }
 
 bool StreamFile::isFile() const noexcept { return backing_->isFile(); }
 
-unsigned int StreamFile::size() const noexcept { return static_cast<unsigned int>(backing_->size()); }
+unsigned int StreamFile::size() const noexcept {
+  return static_cast<unsigned int>(memory_ ? memory_->size() : backing_->size());
+}
 
 void StreamFile::position(unsigned int p) noexcept { position_ = std::min(p, size()); }
 
@@ -150,6 +174,11 @@ StreamFile::Bytes StreamFile::contents() const { return backing_->contents(); }
 
 void StreamFile::putBytes(const void* bytes, std::size_t length) {
   if (length == 0) return;
+  if (memory_ && length <= kMaxData - position_) {
+    memory_->write(position_, bytes, length);
+    position_ += static_cast<unsigned int>(length);
+    return;
+  }
   if (length > kMaxData - position_ || !backing_->write(position_, bytes, length)) {
     writeFailed_ = true;
     return;
@@ -160,7 +189,11 @@ void StreamFile::putBytes(const void* bytes, std::size_t length) {
 unsigned int StreamFile::getBytes(void* out, unsigned int length) {
   const unsigned int available = size() - position_;
   const unsigned int n = std::min(length, available);
-  if (n) backing_->read(position_, out, n);
+  if (memory_) {
+    if (n) std::memcpy(out, memory_->data + position_, n);
+  } else if (n) {
+    backing_->read(position_, out, n);
+  }
   if (n < length) {
     std::memset(static_cast<unsigned char*>(out) + n, 0, length - n);
     shortfall_ += length - n;

@@ -132,6 +132,9 @@ class HOST_API StreamFile {
   }
 
   std::unique_ptr<Backing> backing_;
+  // The bytes when they are in memory (null for a file), so that the typed
+  // writes and reads of packing and unpacking skip the virtual call.
+  MemoryBacking* memory_ = nullptr;
   unsigned int position_ = 0;
   unsigned long long shortfall_ = 0;
   bool writeFailed_ = false;

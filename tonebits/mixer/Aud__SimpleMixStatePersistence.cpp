@@ -39,7 +39,11 @@ float magnitudeToFader(float magnitude) {
 
 // --- Names and registration ---
 
-String SimpleMixState::layerName() { return Streamable::adjustName(typeid(SimpleMixState).name()); }
+String SimpleMixState::layerName() {
+  // Demangling costs more than a whole layer's data: once is enough.
+  static const String name = Streamable::adjustName(typeid(SimpleMixState).name());
+  return name;
+}
 
 String SimpleMixState::subHierarchyName(bool withRoot, bool shortNames) {
   const String base = Taggable::subHierarchyName(withRoot, shortNames);
@@ -250,27 +254,43 @@ const String kMixMute("SimpleMixState.MixChannels.Mute");
 const String kMixSolo("SimpleMixState.MixChannels.Solo");
 const String kMixRouteToOutput("SimpleMixState.MixChannels.RouteToOutput");
 
-// Appends "<key>=<value>" lines.
-class LineWriter {
+// One "<key>=<value>" line, formatted by hand: the C library's formatted
+// printing dominated storing otherwise. The keys are the "%03d" and "%02d"
+// forms (zero-padded to the width, wider when the number is), levels "%.10f"
+// in the C locale whatever the process locale.
+class Line {
  public:
-  explicit LineWriter(KvIniFile::Pairs& pairs) : pairs_(pairs) {}
-  void text(const char* key, const char* value) { add(key, value); }
-  void flag(const char* key, bool on) { add(key, on ? "1" : "0"); }
-  // Ten decimals, like "%.10f" in the C locale whatever the process locale.
-  void level(const char* key, float v) {
-    char digits[64];
-    const auto result = std::to_chars(digits, digits + sizeof digits - 1, v, std::chars_format::fixed, 10);
-    *result.ptr = '\0';
-    add(key, digits);
+  Line& number(int v, int width) {
+    char digits[12];
+    int n = 0;
+    unsigned u = static_cast<unsigned>(v < 0 ? 0 : v);
+    do {
+      digits[n++] = static_cast<char>('0' + u % 10);
+      u /= 10;
+    } while (u);
+    for (int pad = n; pad < width; ++pad) put('0');
+    while (n) put(digits[--n]);
+    return *this;
   }
+  Line& put(char c) {
+    if (length_ < sizeof text_) text_[length_++] = c;
+    return *this;
+  }
+  Line& put(const char* t) {
+    while (*t) put(*t++);
+    return *this;
+  }
+  Line& level(float v) {
+    const auto result = std::to_chars(text_ + length_, text_ + sizeof text_, v, std::chars_format::fixed, 10);
+    if (result.ec == std::errc()) length_ = static_cast<std::size_t>(result.ptr - text_);
+    return *this;
+  }
+  Line& flag(bool on) { return put(on ? '1' : '0'); }
+  void appendTo(KvIniFile::Pairs& pairs) const { pairs.emplace_back(String(text_, length_)); }
 
  private:
-  void add(const char* key, const char* value) {
-    char line[160];
-    std::snprintf(line, sizeof line, "%s=%s", key, value);
-    pairs_.emplace_back(String(line));
-  }
-  KvIniFile::Pairs& pairs_;
+  char text_[96];
+  std::size_t length_ = 0;
 };
 
 // Scanners with the rules of the C library's scanf conversions, over one
@@ -367,48 +387,69 @@ bool scanFlag(const Kv::AttribValuePair& pair, bool& on) {
 
 Aud::eStatus SimpleMixState::storeCompatibleConfigurationInformation(KvIniFile& file) {
   if (!checkValid()) return sSuccess;
-  char key[48];
-  {
-    KvIniFile::Pairs& main = file[kMainSection];
-    main.clear();
-    LineWriter w(main);
-    w.text("Version", "1.1");
-    w.text("AuthorApp", kAuthorApp);
-    w.text("AuthorAppVersion", kAuthorAppVersion);
-  }
+  KvIniFile::Pairs& main = file[kMainSection];
+  main.clear();
+  Line().put("Version=1.1").appendTo(main);
+  Line().put("AuthorApp=").put(kAuthorApp).appendTo(main);
+  Line().put("AuthorAppVersion=").put(kAuthorAppVersion).appendTo(main);
 
-  KvIniFile::Pairs* inputSections[] = {&file[kInputFader], &file[kInputPan], &file[kInputMute],
-                                       &file[kInputSolo], &file[kInputRouteToMix]};
-  for (KvIniFile::Pairs* p : inputSections) p->clear();
-  LineWriter inFader(*inputSections[0]), inPan(*inputSections[1]), inMute(*inputSections[2]),
-      inSolo(*inputSections[3]), inRoute(*inputSections[4]);
+  const std::size_t ni = static_cast<std::size_t>(numInputs), nm = static_cast<std::size_t>(numMixes);
+  KvIniFile::Pairs& inFader = file[kInputFader];
+  KvIniFile::Pairs& inPan = file[kInputPan];
+  KvIniFile::Pairs& inMute = file[kInputMute];
+  KvIniFile::Pairs& inSolo = file[kInputSolo];
+  KvIniFile::Pairs& inRoute = file[kInputRouteToMix];
+  for (KvIniFile::Pairs* p : {&inFader, &inPan, &inMute, &inSolo}) {
+    p->clear();
+    p->reserve(ni);
+  }
+  inRoute.clear();
+  inRoute.reserve(ni * nm);
   for (int i = 0; i < numInputs; ++i) {
-    std::snprintf(key, sizeof key, "%03d", i);
-    inFader.level(key, getInputLevel(i));
-    inPan.level(key, getInputPan(i));
-    inMute.flag(key, getInputMuteState(i));
-    inSolo.flag(key, getInputSoloState(i));
+    Line().number(i, 3).put('=').level(getInputLevel(i)).appendTo(inFader);
+    Line().number(i, 3).put('=').level(getInputPan(i)).appendTo(inPan);
+    Line().number(i, 3).put('=').flag(getInputMuteState(i)).appendTo(inMute);
+    Line().number(i, 3).put('=').flag(getInputSoloState(i)).appendTo(inSolo);
     for (int r = 0; r < numMixes; ++r) {
-      std::snprintf(key, sizeof key, "%03d->%02d", i, r);
-      inRoute.flag(key, getInputRoutedToMix(i, r - 1));
+      Line()
+          .number(i, 3)
+          .put("->")
+          .number(r, 2)
+          .put('=')
+          .flag(getInputRoutedToMix(i, r - 1))
+          .appendTo(inRoute);
     }
   }
 
-  KvIniFile::Pairs* mixSections[] = {&file[kMixFader], &file[kMixMute], &file[kMixSolo],
-                                     &file[kMixRouteToOutput]};
-  for (KvIniFile::Pairs* p : mixSections) p->clear();
-  LineWriter mixFader(*mixSections[0]), mixMute(*mixSections[1]), mixSolo(*mixSections[2]),
-      mixRoute(*mixSections[3]);
+  KvIniFile::Pairs& mixFader = file[kMixFader];
+  KvIniFile::Pairs& mixMute = file[kMixMute];
+  KvIniFile::Pairs& mixSolo = file[kMixSolo];
+  KvIniFile::Pairs& mixRoute = file[kMixRouteToOutput];
+  for (KvIniFile::Pairs* p : {&mixFader, &mixMute, &mixSolo}) {
+    p->clear();
+    p->reserve(nm);
+  }
+  mixRoute.clear();
+  mixRoute.reserve(nm * static_cast<std::size_t>(numOutputs) * 2);
   for (int r = 0; r < numMixes; ++r) {
-    std::snprintf(key, sizeof key, "%02d", r);
-    mixFader.level(key, getMixLevel(r - 1));
-    mixMute.flag(key, getMixMuteState(r - 1));
-    if (r != 0) mixSolo.flag(key, getMixSoloState(r - 1));
+    Line().number(r, 2).put('=').level(getMixLevel(r - 1)).appendTo(mixFader);
+    Line().number(r, 2).put('=').flag(getMixMuteState(r - 1)).appendTo(mixMute);
+    if (r != 0) Line().number(r, 2).put('=').flag(getMixSoloState(r - 1)).appendTo(mixSolo);
     for (int c = r == 0 ? 2 : 0; c < numOutputs; ++c) {
-      std::snprintf(key, sizeof key, "%02dL->%02d", r, c);
-      mixRoute.flag(key, getMixRoutedToOutput(r - 1, c - 2, true));
-      std::snprintf(key, sizeof key, "%02dR->%02d", r, c);
-      mixRoute.flag(key, getMixRoutedToOutput(r - 1, c - 2, false));
+      Line()
+          .number(r, 2)
+          .put("L->")
+          .number(c, 2)
+          .put('=')
+          .flag(getMixRoutedToOutput(r - 1, c - 2, true))
+          .appendTo(mixRoute);
+      Line()
+          .number(r, 2)
+          .put("R->")
+          .number(c, 2)
+          .put('=')
+          .flag(getMixRoutedToOutput(r - 1, c - 2, false))
+          .appendTo(mixRoute);
     }
   }
   return sSuccess;
