@@ -122,6 +122,13 @@ std::size_t WaveReader::read(unsigned char* dst, std::size_t maxFrames) {
   return got;
 }
 
+void WaveReader::seek(uint64_t frame) {
+  if (frame > frames_) frame = frames_;
+  if (std::fseek(file_, static_cast<long>(dataOffset_ + frame * format_.blockAlign), SEEK_SET) != 0)
+    throw WaveError(WaveError::Io, "cannot seek in the input");
+  position_ = frame;
+}
+
 WaveWriter::WaveWriter(const std::string& path, const WaveFormat& format) : path_(path), format_(format) {
   extensible_ = format_.channels > 2 || format_.bitsPerSample > 16;
   tempPath_ = path + ".tmp-" + std::to_string(getpid());

@@ -63,6 +63,8 @@ class WaveReader {
 
   // Reads up to maxFrames interleaved frames; returns the frames read.
   std::size_t read(unsigned char* dst, std::size_t maxFrames);
+  // Moves the read position to a frame (at most frames()).
+  void seek(uint64_t frame);
   uint64_t position() const { return position_; }
 
  private:

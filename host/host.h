@@ -10,6 +10,7 @@
 #include "host/IniFile.h"
 #include "host/Lock.h"
 #include "host/Log.h"
+#include "host/MediaTypes.h"
 #include "host/NamedObjects.h"
 #include "host/ObjectStream.h"
 #include "host/OS.h"
