@@ -75,9 +75,9 @@ KvIniFile::Pairs& KvIniFile::operator[](const String& section) {
 }
 
 const KvIniFile::Pairs& KvIniFile::operator[](const String& section) const {
-  static const Pairs* const empty = new Pairs();
+  static const Pairs empty;
   auto found = index_.find(section.view());
-  return found == index_.end() ? *empty : sections_[found->second].pairs;
+  return found == index_.end() ? empty : sections_[found->second].pairs;
 }
 
 bool KvIniFile::hasSection(const String& section) const {
