@@ -19,3 +19,4 @@
 #include "tonebits/io/Aud__IO_Caps.h"
 #include "tonebits/levels/Aud__DynamicLevelApplyingIterator.h"
 #include "tonebits/levels/Aud__DynamicLevelControl.h"
+#include "tonebits/mixer/Aud__SimpleMixState.h"
