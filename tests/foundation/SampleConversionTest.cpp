@@ -344,8 +344,8 @@ TEST(SampleConversion, WideIntegerFormsAtTheirBoundsAndAtRandom) {
       Bytes back(stored.size());
       ASSERT_TRUE(Aud::convertFromFloat(type, f.data(), back.data(), n));
       for (std::size_t i = 0; i < n; ++i) {
-        SCOPED_TRACE(testing::Message() << "type " << type << " value " << values[i]);
-        ASSERT_EQ(bitsOf(f[i]), bitsOf(Aud::sampleToFloat(type, &stored[i * bytes])));
+        ASSERT_EQ(bitsOf(f[i]), bitsOf(Aud::sampleToFloat(type, &stored[i * bytes])))
+            << type << " " << values[i];
         int32_t got;
         if (type == 2) {
           got = int32_t(uint32_t(back[3 * i] | back[3 * i + 1] << 8 | back[3 * i + 2] << 16) << 8) >> 8;
@@ -354,15 +354,15 @@ TEST(SampleConversion, WideIntegerFormsAtTheirBoundsAndAtRandom) {
         }
         if (type == 6) {
           // 24 bits of precision survive; the ends are exact.
-          ASSERT_LE(std::abs(int64_t(got) - values[i]), 128);
+          ASSERT_LE(std::abs(int64_t(got) - values[i]), 128) << values[i];
           if (values[i] == INT32_MIN || values[i] == INT32_MAX || values[i] == 0) {
-            ASSERT_EQ(got, values[i]);
+            ASSERT_EQ(got, values[i]) << values[i];
           }
         } else {
           // 24-bit: the low three bytes come back; type 5's top byte repeats the sign.
           const int32_t v24 = int32_t(uint32_t(values[i]) << 8) >> 8;
-          ASSERT_EQ(f[i], float(v24) * 0x1p-23f);
-          ASSERT_EQ(got, v24);
+          ASSERT_EQ(f[i], float(v24) * 0x1p-23f) << type << " " << values[i];
+          ASSERT_EQ(got, v24) << type << " " << values[i];
         }
       }
     }

@@ -140,8 +140,12 @@ TONEBITS_API float sampleToFloat(int sampleType, const unsigned char* p) noexcep
 // an unknown type.
 TONEBITS_API bool sampleFromFloat(int sampleType, float v, unsigned char* p) noexcept;
 
-// Block conversions of count samples. Any alignment; source and destination
-// must not overlap. False, writing nothing, for an unknown type.
+// Block conversions of count samples, on the fast path of the active
+// instruction-set level (Aud::Simd), bit for bit the per-sample rules. The
+// stored side may have any alignment, the float side a float's; source and
+// destination must not overlap, and nothing outside the count samples is read
+// or written. False, writing nothing, for an unknown type, or for a missing
+// buffer when count is not 0.
 TONEBITS_API bool convertToFloat(int sampleType, const unsigned char* src, float* dst,
                                  std::size_t count) noexcept;
 TONEBITS_API bool convertFromFloat(int sampleType, const float* src, unsigned char* dst,
