@@ -1,0 +1,59 @@
+// Block kernels behind Aud::convertToFloat and Aud::convertFromFloat, one
+// table per instruction-set level. Internal to the library.
+//
+// Every kernel writes exactly count samples, reads exactly count samples,
+// accepts any alignment and produces the bits of the scalar reference, which
+// is the per-sample rule applied in order.
+#pragma once
+
+#include <cstddef>
+#include <cstring>
+
+#include "tonebits/foundation/Aud__SampleConversion.h"
+
+namespace Aud::detail {
+
+using ToFloatKernel = void (*)(const unsigned char* src, float* dst, std::size_t count) noexcept;
+using FromFloatKernel = void (*)(const float* src, unsigned char* dst, std::size_t count) noexcept;
+
+struct ConversionKernels {
+  ToFloatKernel toFloat[kNumSampleTypes];
+  FromFloatKernel fromFloat[kNumSampleTypes];
+};
+
+extern const ConversionKernels kScalarKernels;
+#if defined(__x86_64__) || defined(__i386__)
+extern const ConversionKernels kSSE2Kernels;
+extern const ConversionKernels kAVX2Kernels;
+#endif
+
+// The scalar reference loops, also used by the fast paths for the samples
+// after the last whole vector.
+template <float (*Rule)(const unsigned char*) noexcept, unsigned Bytes>
+inline void toFloatLoop(const unsigned char* src, float* dst, std::size_t count) noexcept {
+  for (std::size_t i = 0; i < count; ++i) dst[i] = Rule(src + i * Bytes);
+}
+template <void (*Rule)(float, unsigned char*) noexcept, unsigned Bytes>
+inline void fromFloatLoop(const float* src, unsigned char* dst, std::size_t count) noexcept {
+  for (std::size_t i = 0; i < count; ++i) Rule(src[i], dst + i * Bytes);
+}
+
+// Types 0 and 7 read as a plain copy, and so does type 7 written.
+inline void copyFloats(const unsigned char* src, float* dst, std::size_t count) noexcept {
+  std::memcpy(dst, src, count * 4);
+}
+inline void copyFloats(const float* src, unsigned char* dst, std::size_t count) noexcept {
+  std::memcpy(dst, src, count * 4);
+}
+
+// Type 6 read on a vector path. The reference divides in double and rounds
+// the quotient to float: float(RN((i + 0.5) / 2147483647.5)). The vector
+// paths multiply by the reciprocal instead, RN(1 / 2147483647.5) =
+// 2^-31 (1 + 2^-32), a product within one double ulp of the quotient. The
+// two could round to different floats only where that ulp straddles a float
+// midpoint; over all 2^32 inputs the float results are identical (the
+// closest cases, 72 samples of the form +-(2147483583 - 128k), give the same
+// double too), so the division, four times slower, is not needed.
+inline constexpr double kInt32Reciprocal = 0x1.00000001p-31;
+
+}  // namespace Aud::detail
