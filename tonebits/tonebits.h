@@ -6,3 +6,6 @@
 #include "tonebits/foundation/Aud__Simd.h"
 #include "tonebits/foundation/Aud__Status.h"
 #include "tonebits/foundation/Aud__StreamBuffer.h"
+#include "tonebits/metering/Aud__Monitor.h"
+#include "tonebits/metering/Aud__MonitoringPoint.h"
+#include "tonebits/metering/Aud__MonitoringPointManager.h"
