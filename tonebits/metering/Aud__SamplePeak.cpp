@@ -81,21 +81,26 @@ float magnitudeOf(int type, Range r) noexcept {
   }
 }
 
-// The samples a vector loop left over, into the range.
+// The samples a vector loop left over, into the range: one loop per type.
+template <int32_t (*Load)(const unsigned char*) noexcept, unsigned Bytes>
+Range rangeLoop(const unsigned char* s, std::size_t n, Range r) noexcept {
+  for (std::size_t i = 0; i < n; ++i) r.add(Load(s + i * Bytes));
+  return r;
+}
+inline int32_t loadInt8(const unsigned char* p) noexcept { return int8_t(p[0]); }
+inline int32_t loadOffset8(const unsigned char* p) noexcept { return int32_t(p[0]) - 128; }
+
 Range rangeTail(int type, const unsigned char* s, std::size_t n, Range r) noexcept {
   using namespace SampleRules;
-  for (std::size_t i = 0; i < n; ++i) {
-    switch (type) {
-      case 1: r.add(loadLE16(s + 2 * i)); break;
-      case 2: r.add(loadLE24(s + 3 * i)); break;
-      case 3: r.add(int8_t(s[i])); break;
-      case 4: r.add(int32_t(s[i]) - 128); break;
-      case 5: r.add(loadLE24(s + 4 * i)); break;
-      case 6: r.add(loadLE32(s + 4 * i)); break;
-      default: break;
-    }
+  switch (type) {
+    case 1: return rangeLoop<loadLE16, 2>(s, n, r);
+    case 2: return rangeLoop<loadLE24, 3>(s, n, r);
+    case 3: return rangeLoop<loadInt8, 1>(s, n, r);
+    case 4: return rangeLoop<loadOffset8, 1>(s, n, r);
+    case 5: return rangeLoop<loadLE24, 4>(s, n, r);
+    case 6: return rangeLoop<loadLE32, 4>(s, n, r);
+    default: return r;
   }
-  return r;
 }
 
 // The float forms' leftovers, continuing from the vector lanes' peak.
@@ -290,6 +295,13 @@ TONEBITS_AVX2 Range int32RangeAvx2(int type, const unsigned char* s, std::size_t
   if (type == 2) {
     // The 32-byte load reaches 8 bytes past the 24 it uses: stop while it
     // stays inside the block.
+    for (; (i + 16) * 3 + 8 <= n * 3; i += 16) {
+      const __m256i a = unpack24(s + 3 * i), b = unpack24(s + 3 * i + 24);
+      lo0 = _mm256_min_epi32(lo0, a);
+      hi0 = _mm256_max_epi32(hi0, a);
+      lo1 = _mm256_min_epi32(lo1, b);
+      hi1 = _mm256_max_epi32(hi1, b);
+    }
     for (; (i + 8) * 3 + 8 <= n * 3; i += 8) {
       const __m256i v = unpack24(s + 3 * i);
       lo0 = _mm256_min_epi32(lo0, v);
