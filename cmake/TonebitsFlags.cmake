@@ -18,3 +18,7 @@ if(TONEBITS_SANITIZE)
   target_compile_options(tonebits_flags INTERFACE ${_san})
   target_link_options(tonebits_flags INTERFACE ${_san})
 endif()
+if(TONEBITS_BUILD_FUZZ)
+  # Coverage feedback from the library itself, not only from the fuzz drivers.
+  target_compile_options(tonebits_flags INTERFACE -fsanitize=fuzzer-no-link)
+endif()

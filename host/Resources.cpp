@@ -28,9 +28,9 @@ const wchar_t* builtInText(int id) {
     case 2080: return L"ADAT";
     case 2081: return L"SDI";
     case 2082: return L"Project";
-    case 2450: return L"Same source";
-    case 2451: return L"Same source and timecode";
-    case 2452: return L"Never";
+    case 2450: return L"Same source and timecode";
+    case 2451: return L"Same source";
+    case 2452: return L"Always";
     default: return nullptr;
   }
 }

@@ -8,6 +8,7 @@
 #include "host/IdStamp.h"
 #include "host/Lock.h"
 #include "host/Log.h"
+#include "host/MediaTypes.h"
 #include "host/NamedObjects.h"
 #include "host/OS.h"
 #include "host/ProjectTime.h"
