@@ -53,7 +53,8 @@ uint32_t bitsOf(float f) {
   return u;
 }
 
-// Stored forms that sit on an edge of their type's decoding.
+// Stored forms that sit on an edge of their type's decoding; the first two
+// are the loudest of each sign.
 std::vector<Bytes> specialsOf(int type) {
   auto asBytes = [](auto v) {
     Bytes b(sizeof v);
@@ -67,15 +68,15 @@ std::vector<Bytes> specialsOf(int type) {
     case 7: {
       std::vector<Bytes> out;
       for (float f :
-           {FL::quiet_NaN(), -FL::quiet_NaN(), FL::signaling_NaN(), FL::infinity(), -FL::infinity(), -0.0f,
-            0.0f, FL::denorm_min(), -FL::denorm_min(), FL::max(), -FL::max(), 1.0f, -1.0f, 0.99f})
+           {-FL::infinity(), FL::max(), FL::quiet_NaN(), -FL::quiet_NaN(), FL::signaling_NaN(),
+            FL::infinity(), -0.0f, 0.0f, FL::denorm_min(), -FL::denorm_min(), -FL::max(), 1.0f, -1.0f, 0.99f})
         out.push_back(asBytes(f));
       return out;
     }
     case 8: {
       std::vector<Bytes> out;
       for (double d :
-           {DL::quiet_NaN(), -DL::quiet_NaN(), DL::infinity(), -DL::infinity(), 1e300, -1e300, 1e-300,
+           {-DL::infinity(), 1e300, DL::quiet_NaN(), -DL::quiet_NaN(), DL::infinity(), -1e300, 1e-300,
             -DL::denorm_min(), -0.0, 0.99, 1.0 + 0x1p-24, -(1.0 - 0x1p-25), 3.4028235677973366e38})
         out.push_back(asBytes(d));
       return out;
@@ -115,7 +116,7 @@ Bytes makeBlock(int type, std::size_t n, Fill fill, std::mt19937& rng) {
   }
   const auto specials = specialsOf(type);
   if (fill == kOneLoud && n > 0) {
-    const Bytes& loud = specials[rng() % 2];  // the two outermost values
+    const Bytes& loud = specials[rng() % 2];
     std::memcpy(block.data() + (rng() % n) * bytes, loud.data(), bytes);
   }
   if (fill == kSalted) {
