@@ -1,6 +1,8 @@
 // Every public header of the tonebits library.
 #pragma once
 
+#include "tonebits/dsp/Aud__GainCurve.h"
+#include "tonebits/dsp/Aud__MixRender.h"
 #include "tonebits/export.h"
 #include "tonebits/foundation/Aud__AudioPreferences.h"
 #include "tonebits/foundation/Aud__FrameCadence.h"
@@ -12,6 +14,8 @@
 #include "tonebits/foundation/Aud__Status.h"
 #include "tonebits/foundation/Aud__StreamBuffer.h"
 #include "tonebits/io/Aud__IO_Caps.h"
+#include "tonebits/levels/Aud__DynamicLevelApplyingIterator.h"
+#include "tonebits/levels/Aud__DynamicLevelControl.h"
 #include "tonebits/metering/Aud__Monitor.h"
 #include "tonebits/metering/Aud__MonitoringPoint.h"
 #include "tonebits/metering/Aud__MonitoringPointManager.h"

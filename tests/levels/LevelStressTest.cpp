@@ -1,0 +1,141 @@
+// Editors change a store at random while one iterator applies it forwards and
+// another in reverse. Run under ThreadSanitizer in CI: besides races and
+// crashes it checks that no edit makes a step in the gain.
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <atomic>
+#include <chrono>
+#include <cmath>
+#include <random>
+#include <thread>
+
+#include "LevelTestSupport.h"
+#include "tonebits/levels/Aud__DynamicLevelApplyingIterator.h"
+
+namespace {
+
+using namespace levels_test;
+using Aud::DynamicLevelControl::DynamicLevelApplyingIterator;
+
+constexpr double kRate = 48000.0;
+// Nodes sit on a 20 ms grid over [0, 1] s with levels in [0, 1], so a segment
+// runs at least 10 ms (reverse into an end guard) and a glide spans 480
+// samples: no step between samples may exceed 1/450, plus the drift of a
+// chain of float additions over a segment of up to 1 s (48000 additions of at
+// most 2^-24 each).
+constexpr double kGrid = 0.02;
+constexpr int kSlots = 51;
+constexpr float kMaxStep = 1.0f / 450.0f + 48000.0f / 16777216.0f;
+
+double gridTime(std::mt19937& rng) { return kGrid * std::uniform_int_distribution<int>(0, kSlots - 1)(rng); }
+
+void editOnce(Store& s, std::mt19937& rng) {
+  std::uniform_real_distribution<float> level(0.0f, 1.0f);
+  const Store::eNodeType kinds[] = {N, N, N, MD, SG, EG};
+  switch (std::uniform_int_distribution<int>(0, 9)(rng)) {
+    case 0:
+    case 1: s.insert(Node(gridTime(rng), level(rng), kinds[rng() % 6], false)); break;
+    case 2: {
+      const criticalSection lock = s.getLockObject();  // another editor must not erase it first
+      CriticalSectionLock hold(lock);
+      s.erase(s.find(gridTime(rng)));
+      break;
+    }
+    case 3: {
+      const double a = gridTime(rng);
+      s.erase(a, a + 3 * kGrid);
+      break;
+    }
+    case 4:
+    case 5: {
+      const criticalSection lock = s.getLockObject();
+      CriticalSectionLock hold(lock);
+      Store::iterator it = s.find(gridTime(rng));
+      if (it != s.end()) it.setLevel(level(rng));
+      break;
+    }
+    case 6: {
+      const criticalSection lock = s.getLockObject();
+      CriticalSectionLock hold(lock);
+      Store::iterator it = s.find(gridTime(rng));
+      if (it != s.end()) it.setTime(gridTime(rng));
+      break;
+    }
+    case 7: s.setRangeToBlackSection(gridTime(rng), gridTime(rng)); break;
+    case 8: s.setRangeToNonBlackSection(gridTime(rng), gridTime(rng)); break;
+    default: s.eraseNonGuard(gridTime(rng), gridTime(rng) + kGrid); break;
+  }
+}
+
+struct PlayResult {
+  float maxStep = 0.0f;
+  long samples = 0;
+  bool finite = true;
+};
+
+void play(const Store& s, bool reverse, const std::atomic<bool>& stop, unsigned seed, PlayResult& out) {
+  std::mt19937 rng(seed);
+  std::uniform_real_distribution<double> start(0.0, 1.2);
+  DynamicLevelApplyingIterator it;
+  std::vector<float> block(256);
+  while (!stop.load(std::memory_order_relaxed)) {
+    reverse ? it.configureReverse(&s, kRate, start(rng)) : it.configureForwards(&s, kRate, start(rng));
+    float previous = std::nanf("");
+    for (int b = 0; b < 80 && !stop.load(std::memory_order_relaxed); ++b) {
+      std::fill(block.begin(), block.end(), 1.0f);
+      it.apply(block.data(), block.size());
+      for (float g : block) {
+        if (!std::isfinite(g)) out.finite = false;
+        if (!std::isnan(previous)) out.maxStep = std::max(out.maxStep, std::fabs(g - previous));
+        previous = g;
+      }
+      out.samples += static_cast<long>(block.size());
+      std::this_thread::yield();  // playback waits for its device between blocks
+    }
+  }
+}
+
+void stress(int editors) {
+  Store s;
+  for (int k = 0; k < kSlots; k += 3) s.insert(Node(k * kGrid, 0.5f, k % 9 == 0 ? SG : N, false));
+  std::atomic<bool> stop{false};
+  PlayResult forwards, reverse;
+  std::vector<std::thread> threads;
+  threads.emplace_back(play, std::cref(s), false, std::cref(stop), 1u, std::ref(forwards));
+  threads.emplace_back(play, std::cref(s), true, std::cref(stop), 2u, std::ref(reverse));
+  std::atomic<long> edits{0};
+  for (int e = 0; e < editors; ++e) {
+    threads.emplace_back([&, e] {
+      std::mt19937 rng(100 + e);
+      while (!stop.load(std::memory_order_relaxed)) {
+        editOnce(s, rng);
+        ++edits;
+        std::this_thread::yield();
+      }
+    });
+  }
+  // A bounded run, not a measurement: nothing below depends on its length.
+  std::this_thread::sleep_for(std::chrono::milliseconds(700));
+  stop = true;
+  for (std::thread& t : threads) t.join();
+
+  EXPECT_GT(edits.load(), 0);
+  for (const PlayResult* r : {&forwards, &reverse}) {
+    EXPECT_GT(r->samples, 0);
+    EXPECT_TRUE(r->finite);
+    EXPECT_LE(r->maxStep, kMaxStep);
+  }
+  ::testing::Test::RecordProperty("edits", static_cast<int>(edits.load()));
+  ::testing::Test::RecordProperty("samples", static_cast<int>(forwards.samples + reverse.samples));
+  ::testing::Test::RecordProperty("maxStepPerMillion",
+                                  static_cast<int>(std::max(forwards.maxStep, reverse.maxStep) * 1e6f));
+  EXPECT_TRUE(orderedByRawTime(s));
+}
+
+TEST(LevelStress, OneEditorAgainstForwardAndReversePlay) { stress(1); }
+
+// Two editors: black sections walk the store while the other editor erases.
+TEST(LevelStress, TwoEditorsAgainstForwardAndReversePlay) { stress(2); }
+
+}  // namespace
