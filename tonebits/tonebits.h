@@ -19,4 +19,7 @@
 #include "tonebits/io/Aud__IO_Caps.h"
 #include "tonebits/levels/Aud__DynamicLevelApplyingIterator.h"
 #include "tonebits/levels/Aud__DynamicLevelControl.h"
+#include "tonebits/metering/Aud__Monitor.h"
+#include "tonebits/metering/Aud__MonitoringPoint.h"
+#include "tonebits/metering/Aud__MonitoringPointManager.h"
 #include "tonebits/mixer/Aud__SimpleMixState.h"
