@@ -14,3 +14,4 @@
 #include "host/Ptr.h"
 #include "host/Resources.h"
 #include "host/String.h"
+#include "host/Vector.h"
