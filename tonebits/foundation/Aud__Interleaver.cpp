@@ -7,6 +7,7 @@
 
 #include "host/Log.h"
 #include "host/OS.h"
+#include "host/Vector.h"
 #include "tonebits/foundation/Aud__InterleaverKernels.h"
 #include "tonebits/foundation/Aud__SampleConversion.h"
 #include "tonebits/foundation/Aud__Simd.h"
@@ -91,44 +92,39 @@ void exportReference(const unsigned char* const* planes, unsigned char* out, std
   }
 }
 
-// A chunk at a time: each channel through the block conversions into a
-// scratch plane, then the scratch planes joined into the output.
+// A chunk at a time: the planes joined into the output, then the joined
+// samples put through the block conversions in place (each sample's rule
+// does not depend on where it lies), while the chunk is still in cache.
 void exportFast(const unsigned char* const* planes, unsigned char* out, std::size_t numSamples,
-                unsigned channels, int sampleType) noexcept {
+                unsigned channels, int sampleType) {
   const unsigned size = Aud::bytesPerSampleOfType(sampleType);
   const Aud::Simd::eLevel level = Aud::Simd::activeLevel();
   const Aud::Interleave::JoinFn join = Aud::Interleave::findJoin(level, channels, size);
-  if (sampleType == 7) {
-    // The rule is a copy of the bits: join the planes themselves.
-    if (join) return join(planes, out, numSamples);
-    return joinReference(planes, out, numSamples, channels, size);
-  }
-  constexpr std::size_t kChunk = 256;
-  constexpr unsigned kScratchPlanes = 8;
-  alignas(32) float floats[kChunk];
-  alignas(32) unsigned char scratch[kScratchPlanes][kChunk * 8];
-  for (std::size_t done = 0; done < numSamples; done += kChunk) {
-    const std::size_t n = std::min(kChunk, numSamples - done);
-    unsigned char* chunkOut = out + done * channels * size;
+  const Aud::Interleave::JoinAnyFn joinAny = Aud::Interleave::findJoinAnyChannels(level, size);
+  constexpr std::size_t kFloats = 256;
+  alignas(32) float floats[kFloats];
+  const std::size_t chunk = std::max<std::size_t>(1, kFloats / channels);  // groups
+  Vector<const unsigned char*> from(planes, planes + channels);
+  for (std::size_t done = 0; done < numSamples; done += chunk) {
+    const std::size_t groups = std::min(chunk, numSamples - done);
+    unsigned char* joined = out + done * channels * size;
     if (channels == 1) {
-      Aud::convertToFloat(sampleType, planes[0] + done * size, floats, n);
-      Aud::convertFromFloat(sampleType, floats, chunkOut, n);
+      std::memcpy(joined, from[0], groups * size);
     } else if (join) {
-      const unsigned char* converted[kScratchPlanes];
-      for (unsigned c = 0; c < channels; ++c) {
-        Aud::convertToFloat(sampleType, planes[c] + done * size, floats, n);
-        Aud::convertFromFloat(sampleType, floats, scratch[c], n);
-        converted[c] = scratch[c];
-      }
-      join(converted, chunkOut, n);
+      join(from.data(), joined, groups);
+    } else if (joinAny) {
+      joinAny(from.data(), joined, groups, channels);
     } else {
-      // Channel counts without a join kernel: one channel at a time.
-      for (unsigned c = 0; c < channels; ++c) {
-        Aud::convertToFloat(sampleType, planes[c] + done * size, floats, n);
-        Aud::convertFromFloat(sampleType, floats, scratch[0], n);
-        for (std::size_t s = 0; s < n; ++s)
-          std::memcpy(chunkOut + (s * channels + c) * size, scratch[0] + s * size, size);
-      }
+      joinReference(from.data(), joined, groups, channels, size);
+    }
+    for (const unsigned char*& plane : from) plane += groups * size;
+    // Type 7's rule is a copy of the bits: joining was all of it.
+    if (sampleType == 7) continue;
+    const std::size_t samples = groups * channels;
+    for (std::size_t s = 0; s < samples; s += kFloats) {
+      const std::size_t n = std::min(kFloats, samples - s);
+      Aud::convertToFloat(sampleType, joined + s * size, floats, n);
+      Aud::convertFromFloat(sampleType, floats, joined + s * size, n);
     }
   }
 }

@@ -119,7 +119,22 @@ SplitAnyFn findSplitWordsAnyChannels(unsigned stride, unsigned bytes, bool swap)
   }
 }
 
+JoinAnyFn findJoinWordsAnyChannels(unsigned bytes) noexcept {
+  switch (bytes) {
+    case 1: return detail::joinWordsAnyChannels<1>;
+    case 2: return detail::joinWordsAnyChannels<2>;
+    case 3: return detail::joinWordsAnyChannels<3>;
+    case 4: return detail::joinWordsAnyChannels<4>;
+    case 8: return detail::joinWordsAnyChannels<8>;
+    default: return nullptr;
+  }
+}
+
 }  // namespace
+
+JoinAnyFn findJoinAnyChannels(Simd::eLevel level, unsigned bytes) noexcept {
+  return level >= Simd::eSSE2 ? findJoinWordsAnyChannels(bytes) : nullptr;
+}
 
 SplitAnyFn findSplitAnyChannels(Simd::eLevel level, unsigned stride, unsigned bytes, bool swap) noexcept {
   return level >= Simd::eSSE2 ? findSplitWordsAnyChannels(stride, bytes, swap) : nullptr;

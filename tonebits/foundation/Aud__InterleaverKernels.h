@@ -23,9 +23,11 @@ namespace Aud::Interleave {
 
 using SplitFn = void (*)(const unsigned char* src, unsigned char* const* dst, std::size_t groups) noexcept;
 using JoinFn = void (*)(const unsigned char* const* src, unsigned char* dst, std::size_t groups) noexcept;
-// A split for a channel count given at run time.
+// A split and a join for a channel count given at run time.
 using SplitAnyFn = void (*)(const unsigned char* src, unsigned char* const* dst, std::size_t groups,
                             unsigned channels) noexcept;
+using JoinAnyFn = void (*)(const unsigned char* const* src, unsigned char* dst, std::size_t groups,
+                           unsigned channels) noexcept;
 
 // One number per split layout, for switching on it.
 constexpr unsigned layoutKey(unsigned stride, unsigned bytes, bool swap) noexcept {
@@ -49,6 +51,7 @@ SplitFn findSplit(Simd::eLevel level, unsigned channels, unsigned stride, unsign
 JoinFn findJoin(Simd::eLevel level, unsigned channels, unsigned bytes) noexcept;
 // For channel counts without a kernel of their own (above 8).
 SplitAnyFn findSplitAnyChannels(Simd::eLevel level, unsigned stride, unsigned bytes, bool swap) noexcept;
+JoinAnyFn findJoinAnyChannels(Simd::eLevel level, unsigned bytes) noexcept;
 
 // Per instruction set; null when there is none for the layout.
 SplitFn findSplitAVX2(unsigned channels, unsigned stride, unsigned bytes, bool swap) noexcept;
@@ -131,6 +134,16 @@ void joinWords(const unsigned char* const* src, unsigned char* dst, std::size_t 
     for (unsigned c = 0; c < C; ++c) writeWide<B>(out + c * B, readWide<B, false>(in[c] + g * B));
   }
   for (unsigned c = 0; c < C; ++c) copyExact<B, false>(in[c] + (groups - 1) * B, out + c * B);
+}
+
+template <unsigned B>
+void joinWordsAnyChannels(const unsigned char* const* src, unsigned char* dst, std::size_t groups,
+                          unsigned channels) noexcept {
+  if (groups == 0) return;
+  unsigned char* out = dst;
+  for (std::size_t g = 0; g + 1 < groups; ++g, out += std::size_t(channels) * B)
+    for (unsigned c = 0; c < channels; ++c) writeWide<B>(out + c * B, readWide<B, false>(src[c] + g * B));
+  for (unsigned c = 0; c < channels; ++c) copyExact<B, false>(src[c] + (groups - 1) * B, out + c * B);
 }
 
 }  // namespace detail

@@ -209,7 +209,7 @@ __attribute__((target("avx2"))) void joinShuffle(const unsigned char* const* src
   detail::joinWords<C, B>(rest, dst + done * C * B, groups - done);
 }
 
-// ---- tables ----
+// ---- tables (shuffle networks) ----
 
 template <unsigned S, unsigned B, bool Swap>
 SplitFn splitFor(unsigned channels) noexcept {
@@ -239,6 +239,69 @@ JoinFn joinFor(unsigned channels) noexcept {
   }
 }
 
+// ---- 4-byte slots, 4 or 8 channels: dword transposes ----
+
+// Splits eight groups a pass. Each register takes four channels of group g
+// in lane 0 and of group g + 4 in lane 1, so a 4 x 4 transpose within the
+// lanes leaves one channel's eight samples in order in one register; its
+// kept bytes are then gathered to the front.
+template <unsigned C, unsigned B, bool Swap>
+__attribute__((target("avx2"))) void splitSlots4(const unsigned char* src, unsigned char* const* dst,
+                                                 std::size_t groups) noexcept {
+  static_assert(C % 4 == 0 && (B == 3 || B == 4));
+  constexpr unsigned kGroupBytes = C * 4;
+  // Within each lane: the kept bytes of four samples, reversed when Swap.
+  alignas(32) static constexpr auto kKeep = [] {
+    std::array<uint8_t, 32> m{};
+    for (unsigned lane = 0; lane < 2; ++lane)
+      for (unsigned k = 0; k < 16; ++k) {
+        const unsigned s = k / B, b = k % B;
+        m[lane * 16 + k] = s < 4 ? uint8_t(s * 4 + (Swap ? B - 1 - b : b)) : kZeroByte;
+      }
+    return m;
+  }();
+  const __m256i keep = _mm256_load_si256(reinterpret_cast<const __m256i*>(kKeep.data()));
+  const __m256i join = _mm256_setr_epi32(0, 1, 2, 4, 5, 6, 3, 7);  // 12 + 12 bytes together
+  unsigned char* out[C];
+  for (unsigned c = 0; c < C; ++c) out[c] = dst[c];
+  const std::size_t passes = groups / 8;
+  for (std::size_t p = 0; p < passes; ++p) {
+    const unsigned char* in = src + p * 8 * kGroupBytes;
+    for (unsigned q = 0; q < C / 4; ++q) {
+      __m256i r[4];
+      for (unsigned g = 0; g < 4; ++g)
+        r[g] = loadLanes(in + g * kGroupBytes + 16 * q, in + (g + 4) * kGroupBytes + 16 * q);
+      const __m256i t0 = _mm256_unpacklo_epi32(r[0], r[1]), t1 = _mm256_unpackhi_epi32(r[0], r[1]);
+      const __m256i t2 = _mm256_unpacklo_epi32(r[2], r[3]), t3 = _mm256_unpackhi_epi32(r[2], r[3]);
+      const __m256i ch[4] = {_mm256_unpacklo_epi64(t0, t2), _mm256_unpackhi_epi64(t0, t2),
+                             _mm256_unpacklo_epi64(t1, t3), _mm256_unpackhi_epi64(t1, t3)};
+      for (unsigned k = 0; k < 4; ++k) {
+        unsigned char* o = out[4 * q + k] + p * 8 * B;
+        if constexpr (B == 4) {
+          _mm256_storeu_si256(reinterpret_cast<__m256i*>(o), Swap ? _mm256_shuffle_epi8(ch[k], keep) : ch[k]);
+        } else {
+          const __m256i packed = _mm256_permutevar8x32_epi32(_mm256_shuffle_epi8(ch[k], keep), join);
+          _mm_storeu_si128(reinterpret_cast<__m128i*>(o), _mm256_castsi256_si128(packed));
+          _mm_storel_epi64(reinterpret_cast<__m128i*>(o + 16), _mm256_extracti128_si256(packed, 1));
+        }
+      }
+    }
+  }
+  const std::size_t done = passes * 8;
+  unsigned char* rest[C];
+  for (unsigned c = 0; c < C; ++c) rest[c] = out[c] + done * B;
+  detail::splitWords<C, 4, B, Swap>(src + done * kGroupBytes, rest, groups - done);
+}
+
+// ---- tables ----
+
+template <unsigned B, bool Swap>
+SplitFn splitSlots4For(unsigned channels) noexcept {
+  if (channels == 4) return splitSlots4<4, B, Swap>;
+  if (channels == 8) return splitSlots4<8, B, Swap>;
+  return splitFor<4, B, Swap>(channels);
+}
+
 }  // namespace
 
 SplitFn findSplitAVX2(unsigned channels, unsigned stride, unsigned bytes, bool swap) noexcept {
@@ -248,10 +311,10 @@ SplitFn findSplitAVX2(unsigned channels, unsigned stride, unsigned bytes, bool s
     case layoutKey(2, 2, true): return splitFor<2, 2, true>(channels);
     case layoutKey(3, 3, false): return splitFor<3, 3, false>(channels);
     case layoutKey(3, 3, true): return splitFor<3, 3, true>(channels);
-    case layoutKey(4, 3, false): return splitFor<4, 3, false>(channels);
-    case layoutKey(4, 3, true): return splitFor<4, 3, true>(channels);
-    case layoutKey(4, 4, false): return splitFor<4, 4, false>(channels);
-    case layoutKey(4, 4, true): return splitFor<4, 4, true>(channels);
+    case layoutKey(4, 3, false): return splitSlots4For<3, false>(channels);
+    case layoutKey(4, 3, true): return splitSlots4For<3, true>(channels);
+    case layoutKey(4, 4, false): return splitSlots4For<4, false>(channels);
+    case layoutKey(4, 4, true): return splitSlots4For<4, true>(channels);
     default: return nullptr;
   }
 }
