@@ -368,14 +368,19 @@ void checkSplit(const SplitCase& k, std::size_t groups, std::size_t offset, uint
 }
 
 TEST(AudioInterleaver, SplitsEveryLayoutAndChannelCountAtEveryLevel) {
+  // Every slot of 1 to 8 bytes keeping 1 to all of its bytes, either byte
+  // order. Up to 8 channels the lengths reach past one pass of every fast
+  // kernel; above, where one loop serves every count, a few groups do.
   Levels restore;
   uint32_t seed = 0;
   for (unsigned channels = 2; channels <= 32; ++channels)
     for (unsigned stride = 1; stride <= 8; ++stride)
       for (unsigned bytes = 1; bytes <= stride; ++bytes)
         for (bool swap : {false, true})
-          for (std::size_t groups : {1, 2, 37})
+          for (std::size_t groups : {1, 3, 37}) {
+            if (channels > 8 && groups != 3) continue;
             checkSplit({channels, stride, bytes, swap}, groups, 0, ++seed);
+          }
 }
 
 TEST(AudioInterleaver, FastLayoutsAtEveryLengthAndAlignment) {
@@ -391,7 +396,7 @@ TEST(AudioInterleaver, FastLayoutsAtEveryLengthAndAlignment) {
   for (SplitCase k : layouts)
     for (unsigned channels = 2; channels <= 8; ++channels)
       for (std::size_t groups : lengths)
-        for (std::size_t offset : {0, 1, 3}) {
+        for (std::size_t offset : {0, 3}) {
           k.channels = channels;
           checkSplit(k, groups, offset, ++seed);
         }
@@ -500,8 +505,8 @@ TEST(AudioInterleaver, ExportFastPathsMatchTheReference) {
   Levels restore;
   uint32_t seed = 5000;
   for (int type = 0; type < Aud::kNumSampleTypes; ++type) {
-    for (unsigned channels : {1u, 2u, 3u, 5u, 6u, 8u, 9u, 32u}) {
-      for (unsigned samples : {1u, 7u, 31u, 33u, 255u, 256u, 257u, 600u}) {
+    for (unsigned channels : {1u, 2u, 3u, 6u, 8u, 9u, 32u}) {
+      for (unsigned samples : {1u, 31u, 33u, 129u, 600u}) {
         std::vector<Bytes> planes;
         std::vector<const unsigned char*> pointers;
         for (unsigned c = 0; c < channels; ++c) planes.push_back(planeBytes(type, samples, ++seed));
