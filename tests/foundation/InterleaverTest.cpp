@@ -323,6 +323,21 @@ TEST(AudioInterleaver, StereoTwentyFourInFourArrivesPacked) {
   EXPECT_EQ(out.buffers[1].buffer->getUsed(), 6u);
 }
 
+TEST(AudioInterleaver, BlocksHaveRoomForTheirTypeWhateverTheBitsSay) {
+  // Type 0 is described as 24 bits in 4 bytes: 3 bytes of each slot are
+  // kept, yet a reader going by the type reads 4 per sample.
+  Bytes data = randomBytes(2 * 4 * 5, 12);
+  AudioInterleaver il(0, 2, Aud::eDataTypePCM);
+  Aud::StreamBufferList out;
+  ASSERT_EQ(il.deinterleaveAudio(view(data, 0, data.size()), out), AudioInterleaver::eOk);
+  EXPECT_EQ(out.sampleType, 0);
+  expectBlocks(out, expectedBlocks(data.data(), 5, 2, 4, 3, false, false), 5, 3, false);
+  for (const Aud::StreamBuffer& block : out.buffers) {
+    EXPECT_EQ(block.buffer->getUsed(), 15u);
+    EXPECT_GE(block.getBufferSize(), 20u);
+  }
+}
+
 TEST(AudioInterleaver, AESWordsAreReadFromTheirOwnSlots) {
   // 24 significant bits in 4-byte slots: each word must be read where its
   // slot starts, group after group, and land in the first half of a block

@@ -41,14 +41,15 @@ bool canReuse(const Aud::StreamBufferList& out, unsigned channels, uint32_t numS
   return true;
 }
 
+// Blocks of capacity bytes each, of which used count as the samples.
 Aud::StreamBufferList freshBlocks(unsigned channels, uint32_t numSamples, int sampleType,
-                                  std::size_t blockBytes) {
+                                  std::size_t capacity, std::size_t used) {
   Aud::StreamBufferList list;
   list.buffers.reserve(channels);
   for (unsigned c = 0; c < channels; ++c) {
     Aud::StreamBuffer block(0, numSamples, sampleType);
-    block.buffer = Kv::Ptr<iMemHolder>(new ByteBufferImpl(blockBytes));
-    block.buffer->setUsed(blockBytes);
+    block.buffer = Kv::Ptr<iMemHolder>(new ByteBufferImpl(capacity));
+    block.buffer->setUsed(used);
     block.valid = true;
     list.buffers.push_back(block);
   }
@@ -234,7 +235,12 @@ AudioInterleaver::eStatus AudioInterleaver::deinterleaveAudio(const Kv::Ptr<iMem
   const int type = format.getSampleTypeNumber() == 5 ? 2 : format.getSampleTypeNumber();
   const std::size_t blockBytes = std::size_t(numSamples) * bytes;
   if (!canReuse(out, channels, numSamples, blockBytes, data, used)) {
-    Aud::StreamBufferList fresh = freshBlocks(channels, numSamples, type, blockBytes);
+    // A description whose significant bytes are fewer than its sample
+    // type's (a float type described as 24 bits in 4 bytes) gets blocks
+    // with room for the type's samples all the same, so that a reader going
+    // by the list's type stays inside them.
+    const std::size_t capacity = std::size_t(numSamples) * std::max(bytes, Aud::bytesPerSampleOfType(type));
+    Aud::StreamBufferList fresh = freshBlocks(channels, numSamples, type, capacity, blockBytes);
     replaceList(out, fresh);
   }
   if (numSamples == 0) return eOk;
