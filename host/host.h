@@ -20,3 +20,4 @@
 #include "host/StreamClassRegistry.h"
 #include "host/Streamable.h"
 #include "host/String.h"
+#include "host/Vector.h"
