@@ -106,10 +106,11 @@ WaveFormat PlanarWriter::formatFor(unsigned channels, uint32_t sampleRate, int s
   f.channels = header.nChannels;
   f.sampleRate = header.nSamplesPerSec;
   f.blockAlign = header.nBlockAlign;
-  // A WAVE container is whole bytes per sample; the significant bits are
-  // given separately (24 bits in a 4-byte slot).
+  // A WAVE container is whole bytes per sample. 24 bits in a 4-byte slot are
+  // written as 32-bit samples whose low byte is zero: the same values, and a
+  // form every reader takes (several refuse padded containers).
   f.bitsPerSample = static_cast<uint16_t>(header.nBlockAlign / header.nChannels * 8);
-  f.validBitsPerSample = header.wBitsPerSample;
+  f.validBitsPerSample = f.bitsPerSample;
   f.channelMask = channels == 1 ? 0x4 : channels == 2 ? 0x3 : 0;
   return f;
 }

@@ -71,12 +71,13 @@ class DemoDevice : public Aud::Monitor {
   void captured(Aud::StreamBufferList& block) { updateMonitoringPoints(block); }
 };
 
-Aud::DynamicLevelControl::Store makeAutomation() {
+// A fade in, a dip and a fade out, over a programme of the given length.
+Aud::DynamicLevelControl::Store makeAutomation(double seconds) {
   using Node = Aud::DynamicLevelControl::Store::Node;
   Aud::DynamicLevelControl::Store store;
   const std::pair<double, float> nodes[] = {{0.0, 0.0f},  {0.4, 1.0f},  {2.8, 1.0f}, {3.2, 0.5f},
                                             {5.2, 0.5f},  {5.6, 1.0f},  {7.2, 1.0f}, {8.0, 0.0f}};
-  for (const auto& [t, level] : nodes) store.insert(Node(t, level));
+  for (const auto& [t, level] : nodes) store.insert(Node(t * seconds / 8.0, level));
   return store;
 }
 
@@ -121,7 +122,7 @@ int runDemo(int argc, char** argv, int first) {
     eqPointers.push_back(&chain);
   }
 
-  Aud::DynamicLevelControl::Store automation = makeAutomation();
+  Aud::DynamicLevelControl::Store automation = makeAutomation(seconds);
   std::vector<Aud::DynamicLevelControl::DynamicLevelApplyingIterator> levels(kInputs);
   for (auto& it : levels) it.configureForwards(&automation, kRate, 0.0);
 
@@ -169,7 +170,7 @@ int runDemo(int argc, char** argv, int first) {
 
     // The edit a user makes while it plays: the dip goes deeper.
     if (!edited && double(done) / kRate >= editTime) {
-      auto node = automation.find(3.2);
+      auto node = automation.find(3.2 * seconds / 8.0);
       for (int k = 0; k < 2 && node != automation.end(); ++k, ++node) node.setLevel(0.2f);
       edited = true;
     }
