@@ -38,7 +38,7 @@ std::string tickText(double v) {
 }  // namespace
 
 std::string renderSvg(const Chart& c) {
-  const double W = 800, H = 450, left = 70, right = 20, top = 40, bottom = 55;
+  const double W = 800, H = 470, left = 70, right = 20, top = 60, bottom = 55;
   const double pw = W - left - right, ph = H - top - bottom;
   auto fx = [&](double x) {
     const double t = c.logX ? (std::log10(x) - std::log10(c.xMin)) / (std::log10(c.xMax) - std::log10(c.xMin))
@@ -71,16 +71,18 @@ std::string renderSvg(const Chart& c) {
     << "<text x=\"" << left + pw / 2 << "\" y=\"" << H - 12 << "\" text-anchor=\"middle\">" << escape(c.xLabel)
     << "</text>\n<text transform=\"translate(18," << top + ph / 2 << ") rotate(-90)\" text-anchor=\"middle\">"
     << escape(c.yLabel) << "</text>\n";
-  double legendY = top + 16;
+  // The legend sits in a row above the plot, clear of the data.
+  double legendX = left;
   for (const Series& series : c.series) {
     if (series.points.empty()) continue;
     s << "<polyline fill=\"none\" stroke-width=\"2\" stroke=\"" << series.colour << "\" points=\"";
     for (const auto& [x, y] : series.points) s << fx(x) << ',' << fy(y) << ' ';
     s << "\"/>\n";
     if (!series.label.empty()) {
-      s << "<text x=\"" << left + pw - 8 << "\" y=\"" << legendY << "\" text-anchor=\"end\" fill=\""
-        << series.colour << "\">" << escape(series.label) << "</text>\n";
-      legendY += 16;
+      s << "<rect x=\"" << legendX << "\" y=\"" << top - 16 << "\" width=\"14\" height=\"4\" fill=\""
+        << series.colour << "\"/><text x=\"" << legendX + 18 << "\" y=\"" << top - 10 << "\">"
+        << escape(series.label) << "</text>\n";
+      legendX += 30 + 7.0 * static_cast<double>(series.label.size());
     }
   }
   s << "</svg>\n";
