@@ -92,6 +92,8 @@ void BM_DeinterleaveStereo24Packed(benchmark::State& state) { deinterleave(state
 void BM_Deinterleave8ch24in32(benchmark::State& state) { deinterleave(state, 8, 5); }
 void BM_WritePlanarStereo16(benchmark::State& state) { writePlanar(state, 2, 1); }
 void BM_WritePlanarStereo24(benchmark::State& state) { writePlanar(state, 2, 2); }
+// For comparison: a type whose samples do go through the float round trip.
+void BM_WritePlanarStereo24in32(benchmark::State& state) { writePlanar(state, 2, 5); }
 
 void levels(benchmark::internal::Benchmark* b) {
   for (int l = Aud::Simd::eScalar; l <= Aud::Simd::supportedLevel(); ++l) b->Arg(l);
@@ -103,6 +105,7 @@ BENCHMARK(BM_DeinterleaveStereo24Packed)->Apply(levels);
 BENCHMARK(BM_Deinterleave8ch24in32)->Apply(levels);
 BENCHMARK(BM_WritePlanarStereo16)->Apply(levels);
 BENCHMARK(BM_WritePlanarStereo24)->Apply(levels);
+BENCHMARK(BM_WritePlanarStereo24in32)->Apply(levels);
 
 }  // namespace
 

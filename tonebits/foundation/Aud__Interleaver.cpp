@@ -93,6 +93,14 @@ void exportReference(const unsigned char* const* planes, unsigned char* out, std
   }
 }
 
+// Types whose samples come back from float exactly as they went in, so that
+// joining is all the export does: every 8-, 16- and packed 24-bit value is
+// a multiple of its type's step inside the clamp bounds, which float holds
+// exactly and scales back exactly; type 7's rule is a copy of the bits.
+constexpr bool roundTripIsExact(int sampleType) noexcept {
+  return sampleType == 1 || sampleType == 2 || sampleType == 3 || sampleType == 7;
+}
+
 // A chunk at a time: the planes joined into the output, then the joined
 // samples put through the block conversions in place (each sample's rule
 // does not depend on where it lies), while the chunk is still in cache.
@@ -119,8 +127,7 @@ void exportFast(const unsigned char* const* planes, unsigned char* out, std::siz
       joinReference(from.data(), joined, groups, channels, size);
     }
     for (const unsigned char*& plane : from) plane += groups * size;
-    // Type 7's rule is a copy of the bits: joining was all of it.
-    if (sampleType == 7) continue;
+    if (roundTripIsExact(sampleType)) continue;
     const std::size_t samples = groups * channels;
     for (std::size_t s = 0; s < samples; s += kFloats) {
       const std::size_t n = std::min(kFloats, samples - s);

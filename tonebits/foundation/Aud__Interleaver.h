@@ -79,8 +79,9 @@ class TONEBITS_API AudioInterleaver {
   // Splits the used bytes of src into out, one block per channelsPerStream.
   // A single channel shares src's memory (big-endian samples are reversed in
   // place). Several channels are copied into out's own blocks when it has
-  // exactly that many, of this length, each with memory for the samples;
-  // otherwise into fresh blocks. Not recorded in getLastError().
+  // exactly that many, of this length, each with memory for the samples
+  // and none on src's own bytes (the list's fields are then left as they
+  // are); otherwise into fresh blocks. Not recorded in getLastError().
   //   eNoData                 src is null or has no memory
   //   eInvalidChannelCount    channelsPerStream is 0 or above 32
   //   eUnsupportedSampleSize  stride 0; a big-endian single channel whose
