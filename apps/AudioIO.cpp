@@ -18,7 +18,9 @@ WString wide(const std::string& s) { return Kv::WStringFromAscii(s.c_str()); }
 }  // namespace
 
 PlanarBlock::PlanarBlock(unsigned channels, std::size_t frames)
-    : channels_(channels), capacity_(frames), stride_((frames + 15) & ~std::size_t(15)),
+    : channels_(channels),
+      capacity_(frames),
+      stride_((frames + 15) & ~std::size_t(15)),
       data_(stride_ * channels) {}
 
 std::vector<float*> PlanarBlock::pointers() {
@@ -44,10 +46,10 @@ Aud::Metadata metadataOf(const WaveReader& reader) {
 
 PlanarReader::PlanarReader(const std::string& path, bool allowTruncated) : wave_(path) {
   if (wave_.truncated() && !allowTruncated)
-    throw WaveError(WaveError::Truncated,
-                    "'" + path + "': the data chunk is truncated (" + std::to_string(wave_.frames()) + " of " +
-                        std::to_string(wave_.claimedFrames()) +
-                        " frames present); --allow-truncated processes what is there");
+    throw WaveError(WaveError::Truncated, "'" + path + "': the data chunk is truncated (" +
+                                              std::to_string(wave_.frames()) + " of " +
+                                              std::to_string(wave_.claimedFrames()) +
+                                              " frames present); --allow-truncated processes what is there");
   metadata_ = metadataOf(wave_);
   if (metadata_.getSampleTypeNumber() < 0)
     throw WaveError(WaveError::Unsupported, "'" + path + "': no sample type reads this coding");
@@ -92,7 +94,8 @@ int exportTypeFromName(const std::string& name) {
   for (int type : Aud::getExportChoicesAsInt())
     if (Aud::getAsString(type) == wide(name)) return type;
   std::string choices;
-  for (const WString& w : Aud::getExportChoices()) choices += (choices.empty() ? "\"" : ", \"") + std::string(String(w)) + "\"";
+  for (const WString& w : Aud::getExportChoices())
+    choices += (choices.empty() ? "\"" : ", \"") + std::string(String(w)) + "\"";
   throw UsageError("unknown sample type \"" + name + "\" (choose " + choices + ")");
 }
 
@@ -116,7 +119,9 @@ WaveFormat PlanarWriter::formatFor(unsigned channels, uint32_t sampleRate, int s
 }
 
 PlanarWriter::PlanarWriter(const std::string& path, unsigned channels, uint32_t sampleRate, int sampleType)
-    : sampleType_(sampleType), channels_(channels), wave_(path, formatFor(channels, sampleRate, sampleType)),
+    : sampleType_(sampleType),
+      channels_(channels),
+      wave_(path, formatFor(channels, sampleRate, sampleType)),
       interleaver_(sampleType, channels, Aud::eDataType(201)) {}
 
 void PlanarWriter::write(const PlanarBlock& block, std::size_t frames) {

@@ -26,7 +26,8 @@ std::unique_ptr<Aud::DynamicLevelControl::Store> readAutomation(const std::strin
     double level;
     if (levelText.size() > 2 && (levelText.compare(levelText.size() - 2, 2, "dB") == 0 ||
                                  levelText.compare(levelText.size() - 2, 2, "db") == 0)) {
-      level = std::pow(10.0, parseNumber(levelText.substr(0, levelText.size() - 2), where + ": level", -200, 40) / 20.0);
+      level = std::pow(
+          10.0, parseNumber(levelText.substr(0, levelText.size() - 2), where + ": level", -200, 40) / 20.0);
     } else {
       level = parseNumber(levelText, where + ": level", 0.0, 100.0);
     }

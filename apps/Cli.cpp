@@ -109,8 +109,8 @@ void Progress::update(uint64_t done) {
   lastPercent_ = percent;
   shown_ = true;
   const int width = 30, filled = percent * width / 100;
-  std::fprintf(stderr, "\r%s [%.*s%*s] %3d%%", label_.c_str(), filled, "==============================",
-               width - filled, "", percent);
+  std::fprintf(stderr, "\r%s [%.*s%*s] %3d%%", label_.c_str(), filled,
+               "==============================", width - filled, "", percent);
   std::fflush(stderr);
 }
 

@@ -16,8 +16,8 @@
 #include "Svg.h"
 #include "host/IniFile.h"
 #include "tonebits/dsp/Aud__MixRender.h"
-#include "tonebits/foundation/Aud__SampleConversion.h"
 #include "tonebits/dsp/Aud__MultiBandBiquad.h"
+#include "tonebits/foundation/Aud__SampleConversion.h"
 #include "tonebits/levels/Aud__DynamicLevelApplyingIterator.h"
 #include "tonebits/metering/Aud__Monitor.h"
 #include "tonebits/metering/Aud__MonitoringPoint.h"
@@ -48,11 +48,16 @@ void synthesise(PlanarBlock& block, uint64_t first, std::size_t n, std::mt19937&
     const double t = double(first + k) / kRate;
     const double syllables = std::pow(std::max(0.0, std::sin(twoPi * 3.7 * t)), 2.0);
     double voice = 0;
-    for (int h = 1; h <= 8; ++h) voice += std::sin(twoPi * 180.0 * h * t) * (h == 3 || h == 4 ? 0.5 : 0.25) / h;
+    for (int h = 1; h <= 8; ++h)
+      voice += std::sin(twoPi * 180.0 * h * t) * (h == 3 || h == 4 ? 0.5 : 0.25) / h;
     block.channel(0)[k] = float(0.8 * syllables * voice);
     const double tremolo = 0.8 + 0.2 * std::sin(twoPi * 0.5 * t);
-    block.channel(1)[k] = float(0.2 * tremolo * (std::sin(twoPi * 220.0 * t) + std::sin(twoPi * 277.18 * t) + std::sin(twoPi * 329.63 * t)));
-    block.channel(2)[k] = float(0.2 * tremolo * (std::sin(twoPi * 220.7 * t) + std::sin(twoPi * 277.9 * t) + std::sin(twoPi * 330.4 * t)));
+    block.channel(1)[k] =
+        float(0.2 * tremolo *
+              (std::sin(twoPi * 220.0 * t) + std::sin(twoPi * 277.18 * t) + std::sin(twoPi * 329.63 * t)));
+    block.channel(2)[k] =
+        float(0.2 * tremolo *
+              (std::sin(twoPi * 220.7 * t) + std::sin(twoPi * 277.9 * t) + std::sin(twoPi * 330.4 * t)));
     const bool burst = std::fmod(t, 2.0) > 1.2 && std::fmod(t, 2.0) < 1.5;
     block.channel(3)[k] = burst ? gauss(noise) : 0.0f;
     block.channel(4)[k] = float(0.25 * std::sin(twoPi * 55.0 * t));
@@ -75,8 +80,8 @@ class DemoDevice : public Aud::Monitor {
 Aud::DynamicLevelControl::Store makeAutomation(double seconds) {
   using Node = Aud::DynamicLevelControl::Store::Node;
   Aud::DynamicLevelControl::Store store;
-  const std::pair<double, float> nodes[] = {{0.0, 0.0f},  {0.4, 1.0f},  {2.8, 1.0f}, {3.2, 0.5f},
-                                            {5.2, 0.5f},  {5.6, 1.0f},  {7.2, 1.0f}, {8.0, 0.0f}};
+  const std::pair<double, float> nodes[] = {{0.0, 0.0f}, {0.4, 1.0f}, {2.8, 1.0f}, {3.2, 0.5f},
+                                            {5.2, 0.5f}, {5.6, 1.0f}, {7.2, 1.0f}, {8.0, 0.0f}};
   for (const auto& [t, level] : nodes) store.insert(Node(t * seconds / 8.0, level));
   return store;
 }
@@ -190,7 +195,8 @@ int runDemo(int argc, char** argv, int first) {
     writer.write(stereo, n);
     chainSeconds += nowSeconds() - start;
 
-    for (unsigned c = 0; c < kInputs; ++c) inputPeak[c] = std::max(inputPeak[c], inputMeters[c].peakValue(true));
+    for (unsigned c = 0; c < kInputs; ++c)
+      inputPeak[c] = std::max(inputPeak[c], inputMeters[c].peakValue(true));
     for (std::size_t k = 0; k < n; ++k) {
       for (unsigned c = 0; c < 2; ++c) stepPeak[c] = std::max(stepPeak[c], std::fabs(stereoPlanes[c][k]));
       if ((done + k + 1) % pictureStep == 0) {
@@ -227,15 +233,18 @@ int runDemo(int argc, char** argv, int first) {
   writeTextFile(dir + "/demo.svg", renderSvg(chart));
 
   std::printf("tonebits demo: %.1f s of six-channel 24-bit audio at 48 kHz\n", seconds);
-  std::printf("  chain: deinterleave, input meters, convert, 3-band equaliser, level automation\n"
-              "         (edited at %.2f s while playing), mix to stereo, output meters, export\n", editTime);
+  std::printf(
+      "  chain: deinterleave, input meters, convert, 3-band equaliser, level automation\n"
+      "         (edited at %.2f s while playing), mix to stereo, output meters, export\n",
+      editTime);
   std::printf("  input meters (through monitoring points):\n");
   for (unsigned c = 0; c < kInputs; ++c)
     std::printf("    %-9s %8s dBFS\n", kNames[c], formatDb(inputPeak[c]).c_str());
-  std::printf("  output peaks: L %s dBFS, R %s dBFS\n", formatDb(outputPeak[0]).c_str(), formatDb(outputPeak[1]).c_str());
+  std::printf("  output peaks: L %s dBFS, R %s dBFS\n", formatDb(outputPeak[0]).c_str(),
+              formatDb(outputPeak[1]).c_str());
   std::printf("  wrote %s, %s/demo.svg, %s/demo-mix.ini\n", wavPath.c_str(), dir.c_str(), dir.c_str());
-  std::printf("  ran %.0f times faster than real time (%.1f ms for the chain)\n", seconds / std::max(chainSeconds, 1e-9),
-              chainSeconds * 1000);
+  std::printf("  ran %.0f times faster than real time (%.1f ms for the chain)\n",
+              seconds / std::max(chainSeconds, 1e-9), chainSeconds * 1000);
   return kOk;
 }
 

@@ -50,12 +50,15 @@ int runInfo(int argc, char** argv, int first) {
   const Aud::SampleRate rate = sampleRateOf(m.getSamplesPerSec());
 
   std::printf("file:        %s\n", path.c_str());
-  std::printf("coding:      %s (WAVE format tag 0x%04X%s)\n", static_cast<const char*>(m.CompressionFormatAsString()),
-              f.formatTag, f.formatTag == 0xFFFE ? ", extensible" : "");
-  std::printf("sample type: %s (%d)\n", sampleTypeName(m.getSampleTypeNumber()).c_str(), m.getSampleTypeNumber());
+  std::printf("coding:      %s (WAVE format tag 0x%04X%s)\n",
+              static_cast<const char*>(m.CompressionFormatAsString()), f.formatTag,
+              f.formatTag == 0xFFFE ? ", extensible" : "");
+  std::printf("sample type: %s (%d)\n", sampleTypeName(m.getSampleTypeNumber()).c_str(),
+              m.getSampleTypeNumber());
   std::printf("channels:    %u\n", m.getTotalChannels());
-  std::printf("rate:        %u Hz (%s)\n", m.getSamplesPerSec(),
-              rate.valid() ? static_cast<const char*>(String(Aud::getDisplayString(rate))) : "no library rate");
+  std::printf(
+      "rate:        %u Hz (%s)\n", m.getSamplesPerSec(),
+      rate.valid() ? static_cast<const char*>(String(Aud::getDisplayString(rate))) : "no library rate");
   std::printf("stride:      %u bytes\n", m.getStride());
   std::printf("bits:        %u", m.getBitsPerSample());
   if (f.validBitsPerSample != f.bitsPerSample) std::printf(" (%u significant)", f.validBitsPerSample);
@@ -64,11 +67,13 @@ int runInfo(int argc, char** argv, int first) {
   std::printf("duration:    %.3f s\n", seconds);
   if (wave.truncated())
     std::printf("warning:     data chunk truncated: %llu of %llu frames present\n",
-                static_cast<unsigned long long>(wave.frames()), static_cast<unsigned long long>(wave.claimedFrames()));
+                static_cast<unsigned long long>(wave.frames()),
+                static_cast<unsigned long long>(wave.claimedFrames()));
 
   if (args.has("frame-rate")) {
     const FrameRateName& fr = parseFrameRate(args.value("frame-rate"));
-    if (!rate.valid()) throw UsageError("no cadence for a rate of " + std::to_string(m.getSamplesPerSec()) + " Hz");
+    if (!rate.valid())
+      throw UsageError("no cadence for a rate of " + std::to_string(m.getSamplesPerSec()) + " Hz");
     const auto cadence = Aud::Util::getSMPTE_FrameSequence(rate, fr.rate);
     if (cadence.empty()) {
       std::printf("cadence:     none at %s fps for this rate\n", fr.name);

@@ -127,7 +127,8 @@ int runMeter(int argc, char** argv, int first) {
                 static_cast<unsigned long long>(clips[c]), bar, "########################################",
                 40 - bar, "");
   }
-  if (wave.truncated()) std::fprintf(stderr, "warning: '%s' is truncated; metered what is there\n", path.c_str());
+  if (wave.truncated())
+    std::fprintf(stderr, "warning: '%s' is truncated; metered what is there\n", path.c_str());
   return kOk;
 }
 

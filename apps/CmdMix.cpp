@@ -102,10 +102,13 @@ int runMix(int argc, char** argv, int first) {
   KvIniFile ini;
   if (args.has("state") && !ini.load(args.value("state").c_str()))
     throw WaveError(WaveError::Io, "'" + args.value("state") + "': cannot read the mixer state");
-  const int mixRows = std::max(1, std::max(largestIndex(ini, "SimpleMixState.MixChannels.Fader", false),
-                                           largestIndex(ini, "SimpleMixState.InputChannels.RouteToMix", true)) + 1);
+  const int mixRows =
+      std::max(1, std::max(largestIndex(ini, "SimpleMixState.MixChannels.Fader", false),
+                           largestIndex(ini, "SimpleMixState.InputChannels.RouteToMix", true)) +
+                      1);
   int outputs = largestIndex(ini, "SimpleMixState.MixChannels.RouteToOutput", true) - 1;
-  if (args.has("outputs")) outputs = static_cast<int>(parseNumber(args.value("outputs"), "output count", 1, 32));
+  if (args.has("outputs"))
+    outputs = static_cast<int>(parseNumber(args.value("outputs"), "output count", 1, 32));
   outputs = std::max(outputs, args.has("outputs") ? 1 : 2);
 
   Aud::SimpleMixState state(inputs, mixRows - 1, outputs);
@@ -136,7 +139,8 @@ int runMix(int argc, char** argv, int first) {
       PlanarBlock& block = *blocks[k];
       const std::size_t got = readers[k]->readAt(done, block, n);
       // Past its end an input is silent; the kernels work in whole quads.
-      for (unsigned c = 0; c < block.channels(); ++c) std::fill(block.channel(c) + got, block.channel(c) + quads * 4, 0.0f);
+      for (unsigned c = 0; c < block.channels(); ++c)
+        std::fill(block.channel(c) + got, block.channel(c) + quads * 4, 0.0f);
     }
     engine.process(inputPlanes.data(), outputPlanes.data(), quads);
     writer.write(result, n);

@@ -38,11 +38,13 @@ Chart eqChart(const std::vector<BandSpec>& bands, double rate) {
   c.xMin = 10;
   c.xMax = rate / 2;
   c.xTicks = {20, 50, 100, 200, 500, 1000, 2000, 5000, 10000, 20000};
-  c.xTicks.erase(std::remove_if(c.xTicks.begin(), c.xTicks.end(), [&](double x) { return x > c.xMax; }), c.xTicks.end());
+  c.xTicks.erase(std::remove_if(c.xTicks.begin(), c.xTicks.end(), [&](double x) { return x > c.xMax; }),
+                 c.xTicks.end());
   std::vector<std::pair<std::string, Equaliser>> curves;
   for (std::size_t b = 0; b < bands.size() && bands.size() > 1; ++b)
     curves.emplace_back(bands[b].text, Equaliser({bands[b]}, static_cast<float>(rate), 1));
-  curves.emplace_back(bands.size() > 1 ? "chain" : bands[0].text, Equaliser(bands, static_cast<float>(rate), 1));
+  curves.emplace_back(bands.size() > 1 ? "chain" : bands[0].text,
+                      Equaliser(bands, static_cast<float>(rate), 1));
   double lo = -3, hi = 3;
   for (std::size_t k = 0; k < curves.size(); ++k) {
     Series s{curves[k].first, k + 1 == curves.size() ? "#000000" : kColours[k % 6], {}};

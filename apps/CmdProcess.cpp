@@ -63,8 +63,11 @@ int runProcess(int argc, char** argv, int first) {
   if (args.has("gain") && args.has("fader")) throw UsageError("give --gain or --fader, not both");
 
   float gain = 1.0f;
-  if (args.has("gain")) gain = static_cast<float>(std::pow(10.0, parseNumber(args.value("gain"), "gain", -120, 40) / 20.0));
-  if (args.has("fader")) gain = faderToGain(parseLaw(args.value("law", "mixer")), parseNumber(args.value("fader"), "fader position"));
+  if (args.has("gain"))
+    gain = static_cast<float>(std::pow(10.0, parseNumber(args.value("gain"), "gain", -120, 40) / 20.0));
+  if (args.has("fader"))
+    gain =
+        faderToGain(parseLaw(args.value("law", "mixer")), parseNumber(args.value("fader"), "fader position"));
   if (args.has("law") && !args.has("fader")) throw UsageError("--law goes with --fader");
   std::vector<BandSpec> bands;
   for (const std::string& spec : args.values("eq")) bands.push_back(parseBand(spec));
@@ -73,7 +76,8 @@ int runProcess(int argc, char** argv, int first) {
   const bool reverse = args.has("reverse");
 
   PlanarReader reader(in, args.has("allow-truncated"));
-  const int type = args.has("type") ? exportTypeFromName(args.value("type")) : defaultOutputType(reader.metadata());
+  const int type =
+      args.has("type") ? exportTypeFromName(args.value("type")) : defaultOutputType(reader.metadata());
   const unsigned channels = reader.channels();
   const double rate = reader.sampleRate();
   Equaliser eq(bands, static_cast<float>(rate), channels);

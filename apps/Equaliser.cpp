@@ -20,15 +20,22 @@ BandSpec parseBand(const std::string& text) {
     if (colon == std::string::npos) break;
     start = colon + 1;
   }
-  if (parts.size() < 2 || parts.size() > 4) throw UsageError("bad band '" + text + "' (TYPE:FREQ[:WIDTH][:GAIN])");
+  if (parts.size() < 2 || parts.size() > 4)
+    throw UsageError("bad band '" + text + "' (TYPE:FREQ[:WIDTH][:GAIN])");
   struct Name {
     const char* name;
     Biquad::eFilterType type;
   };
   static const Name kNames[] = {
-      {"lowpass", Biquad::LowPass},     {"highpass", Biquad::HighPass},   {"bandpass", Biquad::BandPassSkirt},
-      {"bandpass-peak", Biquad::BandPassPeak}, {"notch", Biquad::Notch}, {"allpass", Biquad::AllPass},
-      {"peak", Biquad::PeakingEQ},      {"lowshelf", Biquad::LowShelf},   {"highshelf", Biquad::HighShelf},
+      {"lowpass", Biquad::LowPass},
+      {"highpass", Biquad::HighPass},
+      {"bandpass", Biquad::BandPassSkirt},
+      {"bandpass-peak", Biquad::BandPassPeak},
+      {"notch", Biquad::Notch},
+      {"allpass", Biquad::AllPass},
+      {"peak", Biquad::PeakingEQ},
+      {"lowshelf", Biquad::LowShelf},
+      {"highshelf", Biquad::HighShelf},
   };
   BandSpec band{};
   band.text = text;
@@ -38,7 +45,10 @@ BandSpec parseBand(const std::string& text) {
   if (!known) throw UsageError("unknown band type '" + parts[0] + "' in '" + text + "'");
   const bool shelf = band.type == Biquad::LowShelf || band.type == Biquad::HighShelf;
   band.frequency = static_cast<float>(parseNumber(parts[1], "band frequency", 1.0, 1e6));
-  std::string width = parts.size() > 2 && !parts[2].empty() ? parts[2] : (shelf ? "1s" : band.type == Biquad::PeakingEQ ? "1q" : "0.7071q");
+  std::string width = parts.size() > 2 && !parts[2].empty() ? parts[2]
+                                                            : (shelf                            ? "1s"
+                                                               : band.type == Biquad::PeakingEQ ? "1q"
+                                                                                                : "0.7071q");
   const char unit = width.back();
   const double amount = parseNumber(width.substr(0, width.size() - 1), "band width", 1e-4, 1e4);
   if (unit == 'q') {
@@ -48,7 +58,8 @@ BandSpec parseBand(const std::string& text) {
   } else if (unit == 's' && shelf) {
     band.shape.setAsS(static_cast<float>(amount));
   } else {
-    throw UsageError("band width '" + width + "' does not suit '" + parts[0] + "' (q, o for passes and peaks; q, s for shelves)");
+    throw UsageError("band width '" + width + "' does not suit '" + parts[0] +
+                     "' (q, o for passes and peaks; q, s for shelves)");
   }
   band.gainDb = parts.size() > 3 ? parseNumber(parts[3], "band gain", -60.0, 60.0) : 0.0;
   return band;
@@ -87,11 +98,14 @@ void build(Chains<N>& c, const std::vector<BandSpec>& bands, float rate, unsigne
 }  // namespace
 
 Equaliser::Equaliser(const std::vector<BandSpec>& bands, float sampleRate, unsigned channels)
-    : bands_(static_cast<unsigned>(bands.size())), nyquist_(sampleRate / 2.0), impl_(std::make_unique<Impl>()) {
+    : bands_(static_cast<unsigned>(bands.size())),
+      nyquist_(sampleRate / 2.0),
+      impl_(std::make_unique<Impl>()) {
   if (bands.size() > 5) throw UsageError("at most five equaliser bands");
   for (const BandSpec& b : bands)
     if (!(b.frequency < sampleRate / 2))
-      throw UsageError("band '" + b.text + "' lies above the Nyquist frequency (" + std::to_string(sampleRate / 2) + " Hz)");
+      throw UsageError("band '" + b.text + "' lies above the Nyquist frequency (" +
+                       std::to_string(sampleRate / 2) + " Hz)");
   try {
     switch (bands.size()) {
       case 0: break;
@@ -135,7 +149,8 @@ void Equaliser::process(float* const* channels, unsigned count) {
 double Equaliser::responseAt(double hertz) const {
   if (bands_ == 0) return 1.0;
   hertz /= nyquist_;  // the filters take a fraction of the Nyquist frequency
-  if (bands_ == 1) return impl_->single.empty() ? 1.0 : impl_->single[0].getResponseMagnitudeAtFrequency(float(hertz));
+  if (bands_ == 1)
+    return impl_->single.empty() ? 1.0 : impl_->single[0].getResponseMagnitudeAtFrequency(float(hertz));
   return std::visit(
       [&](auto& c) -> double {
         if constexpr (std::is_same_v<std::decay_t<decltype(c)>, std::monostate>) {

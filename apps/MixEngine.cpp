@@ -12,8 +12,14 @@ using Aud::GainCurve::Curve;
 using Aud::GainCurve::MixerStyleLog1;
 
 MixEngine::MixEngine(Aud::SimpleMixState& state, int inputs, int mixRows, int outputs)
-    : inputs_(inputs), mixRows_(mixRows), outputs_(outputs), gainL_(inputs), gainR_(inputs), mixGain_(mixRows),
-      inputRows_(inputs), outputFeeds_(outputs) {
+    : inputs_(inputs),
+      mixRows_(mixRows),
+      outputs_(outputs),
+      gainL_(inputs),
+      gainR_(inputs),
+      mixGain_(mixRows),
+      inputRows_(inputs),
+      outputFeeds_(outputs) {
   bool anyInputSolo = false, anyMixSolo = false;
   for (int i = 0; i < inputs; ++i) anyInputSolo |= state.getInputSoloState(i);
   for (int m = 0; m < mixRows - 1; ++m) anyMixSolo |= state.getMixSoloState(m);

@@ -22,7 +22,7 @@ class MixEngine {
  private:
   int inputs_, mixRows_, outputs_;
   std::vector<float> gainL_, gainR_, mixGain_;
-  std::vector<std::vector<int>> inputRows_;                  // mix rows each input feeds
+  std::vector<std::vector<int>> inputRows_;                    // mix rows each input feeds
   std::vector<std::vector<std::pair<int, int>>> outputFeeds_;  // (row, side) feeding each output
   std::vector<float> buses_;
   unsigned busQuads_ = 0;

@@ -63,14 +63,14 @@ std::string renderSvg(const Chart& c) {
   }
   for (double y : c.yTicks) {
     s << "<line x1=\"" << left << "\" y1=\"" << fy(y) << "\" x2=\"" << left + pw << "\" y2=\"" << fy(y)
-      << "\" stroke=\"#ddd\"/>\n<text x=\"" << left - 6 << "\" y=\"" << fy(y) + 4
-      << "\" text-anchor=\"end\">" << tickText(y) << "</text>\n";
+      << "\" stroke=\"#ddd\"/>\n<text x=\"" << left - 6 << "\" y=\"" << fy(y) + 4 << "\" text-anchor=\"end\">"
+      << tickText(y) << "</text>\n";
   }
   s << "<rect x=\"" << left << "\" y=\"" << top << "\" width=\"" << pw << "\" height=\"" << ph
     << "\" fill=\"none\" stroke=\"#444\"/>\n"
-    << "<text x=\"" << left + pw / 2 << "\" y=\"" << H - 12 << "\" text-anchor=\"middle\">" << escape(c.xLabel)
-    << "</text>\n<text transform=\"translate(18," << top + ph / 2 << ") rotate(-90)\" text-anchor=\"middle\">"
-    << escape(c.yLabel) << "</text>\n";
+    << "<text x=\"" << left + pw / 2 << "\" y=\"" << H - 12 << "\" text-anchor=\"middle\">"
+    << escape(c.xLabel) << "</text>\n<text transform=\"translate(18," << top + ph / 2
+    << ") rotate(-90)\" text-anchor=\"middle\">" << escape(c.yLabel) << "</text>\n";
   // The legend sits in a row above the plot, clear of the data.
   double legendX = left;
   for (const Series& series : c.series) {

@@ -48,7 +48,8 @@ WaveReader::WaveReader(const std::string& path) {
   uint64_t pos = 12;
   while (pos + 8 <= fileSize && !(haveFmt && haveData)) {
     unsigned char header[8];
-    if (std::fseek(file_, static_cast<long>(pos), SEEK_SET) != 0 || std::fread(header, 1, 8, file_) != 8) break;
+    if (std::fseek(file_, static_cast<long>(pos), SEEK_SET) != 0 || std::fread(header, 1, 8, file_) != 8)
+      break;
     const uint32_t size = le32(header + 4);
     const uint64_t body = pos + 8;
     if (std::memcmp(header, "fmt ", 4) == 0) {
@@ -192,7 +193,8 @@ void WaveWriter::commit() {
 }
 
 bool sameFile(const std::string& a, const std::string& b) {
-  struct stat sa {}, sb {};
+  struct stat sa {
+  }, sb{};
   if (stat(a.c_str(), &sa) != 0 || stat(b.c_str(), &sb) != 0) return false;
   return sa.st_dev == sb.st_dev && sa.st_ino == sb.st_ino;
 }

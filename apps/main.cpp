@@ -30,13 +30,15 @@ const Command kCommands[] = {
 void usage(std::FILE* out) {
   std::fprintf(out, "usage: tonebits COMMAND [OPTIONS] [ARGS]\n\ncommands:\n");
   for (const Command& c : kCommands) std::fprintf(out, "  %-8s %s\n", c.name, c.summary);
-  std::fprintf(out, "\n'tonebits COMMAND --help' describes one command. Version %s.\n", tonebitsDllVersionStr());
+  std::fprintf(out, "\n'tonebits COMMAND --help' describes one command. Version %s.\n",
+               tonebitsDllVersionStr());
 }
 
 }  // namespace
 
 int main(int argc, char** argv) {
-  if (argc < 2 || !std::strcmp(argv[1], "--help") || !std::strcmp(argv[1], "-h") || !std::strcmp(argv[1], "help")) {
+  if (argc < 2 || !std::strcmp(argv[1], "--help") || !std::strcmp(argv[1], "-h") ||
+      !std::strcmp(argv[1], "help")) {
     usage(argc < 2 ? stderr : stdout);
     return argc < 2 ? cli::kUsage : cli::kOk;
   }

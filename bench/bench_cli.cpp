@@ -48,7 +48,8 @@ void prepare() {
 }
 
 // Alternates the two commands and reports each one's best time.
-void compare(benchmark::State& state, const std::vector<std::string>& tool, const std::vector<std::string>& sox) {
+void compare(benchmark::State& state, const std::vector<std::string>& tool,
+             const std::vector<std::string>& sox) {
   prepare();
   double bestTool = 1e9, bestSox = 1e9;
   for (auto _ : state) {

@@ -15,14 +15,18 @@
 int main() {
   const double rate = 48000;
   std::vector<float> samples(48000);
-  for (std::size_t i = 0; i < samples.size(); ++i) samples[i] = 0.5f * float(std::sin(i * 2 * std::numbers::pi * 440 / rate));
+  for (std::size_t i = 0; i < samples.size(); ++i)
+    samples[i] = 0.5f * float(std::sin(i * 2 * std::numbers::pi * 440 / rate));
 
   // Bass cut, presence dip, air lift.
   using Aud::Filter::Biquad;
   Aud::Filter::MultiBandBiquad<3> eq;
-  eq.getBand(0).configure(Biquad::HighPass, 80.0f, float(rate), Biquad::ShapeDescriptor(Biquad::ShapeDescriptor::Q, 0.707f), 0.0);
-  eq.getBand(1).configure(Biquad::PeakingEQ, 3000.0f, float(rate), Biquad::ShapeDescriptor(Biquad::ShapeDescriptor::Q, 1.0f), -3.0);
-  eq.getBand(2).configure(Biquad::HighShelf, 10000.0f, float(rate), Biquad::ShapeDescriptor(Biquad::ShapeDescriptor::S, 1.0f), 2.0);
+  eq.getBand(0).configure(Biquad::HighPass, 80.0f, float(rate),
+                          Biquad::ShapeDescriptor(Biquad::ShapeDescriptor::Q, 0.707f), 0.0);
+  eq.getBand(1).configure(Biquad::PeakingEQ, 3000.0f, float(rate),
+                          Biquad::ShapeDescriptor(Biquad::ShapeDescriptor::Q, 1.0f), -3.0);
+  eq.getBand(2).configure(Biquad::HighShelf, 10000.0f, float(rate),
+                          Biquad::ShapeDescriptor(Biquad::ShapeDescriptor::S, 1.0f), 2.0);
   for (unsigned b = 0; b < 3; ++b) eq.getBand(b).setActive(true);
   eq.processBlock(samples.data(), samples.data(), static_cast<unsigned>(samples.size()));
 
@@ -39,7 +43,8 @@ int main() {
 
   for (double t : {0.1, 0.25, 0.7, 0.9}) {
     float peak = 0;
-    for (std::size_t i = std::size_t(t * rate); i < std::size_t(t * rate) + 480; ++i) peak = std::fmax(peak, std::fabs(samples[i]));
+    for (std::size_t i = std::size_t(t * rate); i < std::size_t(t * rate) + 480; ++i)
+      peak = std::fmax(peak, std::fabs(samples[i]));
     std::printf("t = %.2f s: gain %.3f, peak %.3f\n", t, store.getLevelAtTime(t), peak);
   }
   return 0;

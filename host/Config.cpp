@@ -49,11 +49,15 @@ int config_int(const char* key, int defaultValue) {
   return found == s.config.end() ? defaultValue : found->second;
 }
 
-int EditorPreferences::getPreference(const String& key, int defaultValue) const { return get(key, defaultValue); }
+int EditorPreferences::getPreference(const String& key, int defaultValue) const {
+  return get(key, defaultValue);
+}
 double EditorPreferences::getPreference(const String& key, double defaultValue) const {
   return get(key, defaultValue);
 }
-bool EditorPreferences::getPreference(const String& key, bool defaultValue) const { return get(key, defaultValue); }
+bool EditorPreferences::getPreference(const String& key, bool defaultValue) const {
+  return get(key, defaultValue);
+}
 void EditorPreferences::setPreference(const String& key, int value) { set(key, value); }
 void EditorPreferences::setPreference(const String& key, double value) { set(key, value); }
 void EditorPreferences::setPreference(const String& key, bool value) { set(key, value); }

@@ -45,7 +45,8 @@ bool String::compareCaseInsensitive(const char* text) const noexcept {
   if (n != text_.size()) return false;
   for (std::size_t i = 0; i < n; ++i) {
     auto lower = [](unsigned char c) { return (c >= 'A' && c <= 'Z') ? c + 32 : c; };
-    if (lower(static_cast<unsigned char>(text_[i])) != lower(static_cast<unsigned char>(text[i]))) return false;
+    if (lower(static_cast<unsigned char>(text_[i])) != lower(static_cast<unsigned char>(text[i])))
+      return false;
   }
   return true;
 }
@@ -61,8 +62,9 @@ WString WStringFromAscii(const char* text) {
 
 WString WStringFromInteger(int value) {
   // Digits of the magnitude as unsigned, so INT_MIN has its own digits.
-  unsigned long long magnitude = value < 0 ? 0ull - static_cast<unsigned long long>(static_cast<long long>(value))
-                                           : static_cast<unsigned long long>(value);
+  unsigned long long magnitude = value < 0
+                                     ? 0ull - static_cast<unsigned long long>(static_cast<long long>(value))
+                                     : static_cast<unsigned long long>(value);
   wchar_t digits[24];
   int n = 0;
   do {

@@ -20,13 +20,19 @@ TEST(CriticalSection, IsReentrantAndCopiesShareTheLock) {
 
   // Another thread cannot take the copy while this thread holds the original.
   std::atomic<bool> taken{false};
-  std::thread other([&] { taken = copy.tryEnter(); if (taken) copy.leave(); });
+  std::thread other([&] {
+    taken = copy.tryEnter();
+    if (taken) copy.leave();
+  });
   other.join();
   EXPECT_FALSE(taken.load());
 
   cs.leave();
   cs.leave();
-  std::thread again([&] { taken = copy.tryEnter(); if (taken) copy.leave(); });
+  std::thread again([&] {
+    taken = copy.tryEnter();
+    if (taken) copy.leave();
+  });
   again.join();
   EXPECT_TRUE(taken.load());
 
@@ -200,7 +206,8 @@ TEST(NamedObjects, OneObjectPerNameMadeOnceAcrossThreads) {
   auto& ns = Kv::NamedObjectsNamespace::getGlobalNamespaceInstance();
   Counter* seen[4] = {};
   std::vector<std::thread> threads;
-  for (int i = 0; i < 4; ++i) threads.emplace_back([&, i] { seen[i] = ns.findOrCreate<Counter>("host-test"); });
+  for (int i = 0; i < 4; ++i)
+    threads.emplace_back([&, i] { seen[i] = ns.findOrCreate<Counter>("host-test"); });
   for (auto& t : threads) t.join();
   EXPECT_EQ(Counter::made.load(), 1);
   for (Counter* c : seen) EXPECT_EQ(c, seen[0]);
