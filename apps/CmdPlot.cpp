@@ -126,7 +126,7 @@ int runPlot(int argc, char** argv, int first) {
   Chart chart;
   if (kind == "eq") {
     std::vector<BandSpec> bands;
-    for (const std::string& spec : args.values("eq")) bands.push_back(parseBand(spec));
+    for (const std::string& band : args.values("eq")) bands.push_back(parseBand(band));
     if (bands.empty()) throw UsageError("plot eq needs at least one --eq band");
     chart = eqChart(bands, parseNumber(args.value("rate", "48000"), "rate", 8000, 384000));
   } else if (kind == "law") {

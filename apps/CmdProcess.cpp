@@ -70,7 +70,7 @@ int runProcess(int argc, char** argv, int first) {
         faderToGain(parseLaw(args.value("law", "mixer")), parseNumber(args.value("fader"), "fader position"));
   if (args.has("law") && !args.has("fader")) throw UsageError("--law goes with --fader");
   std::vector<BandSpec> bands;
-  for (const std::string& spec : args.values("eq")) bands.push_back(parseBand(spec));
+  for (const std::string& band : args.values("eq")) bands.push_back(parseBand(band));
   std::unique_ptr<Aud::DynamicLevelControl::Store> automation;
   if (args.has("automation")) automation = readAutomation(args.value("automation"));
   const bool reverse = args.has("reverse");
