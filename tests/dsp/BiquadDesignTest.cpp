@@ -1,32 +1,25 @@
 #include <gtest/gtest.h>
 
+#include <array>
 #include <cmath>
-#include <complex>
 #include <functional>
 #include <random>
-#include <vector>
 
 #include "host/Exception.h"
-#include "tests/dsp/BiquadSupport.h"
+#include "tests/dsp/DspSupport.h"
 #include "tonebits/dsp/Aud__MultiBandBiquad.h"
 
 namespace {
 
-using namespace biquad_test;
+using namespace dsp_test;
 using Aud::Filter::MultiBandBiquad;
 
 // The cookbook designs as usually published (shelves through alpha, the
-// slope through (A + 1/A)(1/S - 1) + 2), written apart from the library.
-struct Design {
-  double b0, b1, b2, a0, a1, a2;
-};
-
-Design cookbook(Biquad::eFilterType type, double f0, double fs, Shape shape, double dBgain) {
-  const double pi = std::acos(-1.0);
-  const double A = std::pow(10.0, dBgain / 40.0);
-  const double w0 = 2.0 * pi * f0 / fs;
-  const double s = std::sin(w0), c = std::cos(w0);
-  const double v = shape.getValue();
+// slope through (A + 1/A)(1/S - 1) + 2), written apart from the library:
+// b0, b1, b2, a0, a1, a2.
+std::array<double, 6> cookbook(Biquad::eFilterType type, double f0, double fs, Shape shape, double dBgain) {
+  const double A = std::pow(10.0, dBgain / 40.0), w0 = 2.0 * M_PI * f0 / fs;
+  const double s = std::sin(w0), c = std::cos(w0), v = shape.getValue();
   double alpha = 0.0;
   switch (shape.getType()) {
     case Shape::Q: alpha = s / (2.0 * v); break;
@@ -56,94 +49,82 @@ Design cookbook(Biquad::eFilterType type, double f0, double fs, Shape shape, dou
   }
 }
 
-// Within about one float rounding of the double value.
-void expectFloatOf(float stored, double expected, const char* what) {
-  EXPECT_NEAR(stored, expected, std::abs(expected) * 2.5e-7 + 1e-30) << what;
-}
-
 TEST(BiquadDesign, EveryTypeAndShapeMatchesTheCookbook) {
-  const int types[] = {1, 2, 3, 4, 5, 6, 7, 8, 9};
-  const float frequencies[] = {30.0f, 1000.0f, 15000.0f};
-  const float rates[] = {44100.0f, 96000.0f};
-  const double gains[] = {-12.0, 0.0, 6.5};
-  for (int t : types) {
+  for (int t = 1; t <= 9; ++t) {
     const bool shelf = t >= 8;
     const Shape shapes[] = {shelf ? Shape(Shape::S, 0.5f) : Shape(Shape::Bandwidth, 0.7f),
                             shelf ? Shape(Shape::S, 1.0f) : Shape(Shape::Bandwidth, 2.0f),
                             Shape(Shape::Q, 0.7071f), Shape(Shape::Q, 4.0f)};
-    for (float f : frequencies)
-      for (float fs : rates)
+    for (float f : {30.0f, 1000.0f, 15000.0f})
+      for (float fs : {44100.0f, 96000.0f})
         for (const Shape& shape : shapes)
-          for (double g : gains) {
+          for (double g : {-12.0, 0.0, 6.5}) {
             SCOPED_TRACE(testing::Message() << "type " << t << " f " << f << " fs " << fs << " shape "
                                             << shape.getType() << "/" << shape.getValue() << " gain " << g);
             Biquad b;
             b.configure(typeAt(t), f, fs, shape, g);
-            const Design d = cookbook(typeAt(t), f, fs, shape, g);
-            const float* c = BiquadAccess::coefficients(b);
-            expectFloatOf(c[0], d.b0 / d.a0, "b0");
-            expectFloatOf(c[1], d.b1 / d.a0, "b1");
-            expectFloatOf(c[2], d.b2 / d.a0, "b2");
-            expectFloatOf(c[3], d.a1 / d.a0, "a1");
-            expectFloatOf(c[4], d.a2 / d.a0, "a2");
-            // The raw set keeps the unnormalised values, a's first.
+            const auto d = cookbook(typeAt(t), f, fs, shape, g);
+            // The raw set keeps the unnormalised values, a's first; the
+            // stored floats are b0 b1 b2 a1 a2 over a0, each rounded once.
             const double* raw = BiquadAccess::rawCoefficients(b);
-            const double want[6] = {d.a0, d.a1, d.a2, d.b0, d.b1, d.b2};
+            const double want[6] = {d[3], d[4], d[5], d[0], d[1], d[2]};
             for (int i = 0; i < 6; ++i) EXPECT_NEAR(raw[i], want[i], 1e-12 * (1.0 + std::abs(want[i]))) << i;
-            // The stored floats are the raw ratios rounded once.
-            EXPECT_EQ(c[0], float(raw[3] / raw[0]));
-            EXPECT_EQ(c[4], float(raw[2] / raw[0]));
-            EXPECT_EQ(b.getFilterType(), typeAt(t));
-            EXPECT_EQ(b.getFrequency(), f);
-            EXPECT_EQ(b.getSamplingRate(), fs);
-            EXPECT_EQ(b.getShapeDescriptor().getType(), shape.getType());
-            EXPECT_EQ(b.getShapeDescriptor().getValue(), shape.getValue());
-            EXPECT_EQ(b.getGain(), g);
+            const float* c = BiquadAccess::coefficients(b);
+            const int ratio[5] = {3, 4, 5, 1, 2};
+            for (int i = 0; i < 5; ++i) {
+              EXPECT_EQ(c[i], float(raw[ratio[i]] / raw[0])) << i;
+              const double exact = want[ratio[i]] / want[0];
+              EXPECT_NEAR(c[i], exact, std::abs(exact) * 2.5e-7 + 1e-30) << i;
+            }
           }
+  }
+  // The published low-pass example.
+  Biquad b(Biquad::LowPass, 1000.0f, 48000.0f, Shape(Shape::Q, 0.7071f), 0.0, true);
+  const float want[5] = {0.003916123f, 0.007832247f, 0.003916123f, -1.815340f, 0.8310041f};
+  for (int i = 0; i < 5; ++i)
+    EXPECT_NEAR(BiquadAccess::coefficients(b)[i], want[i], std::abs(want[i]) * 2e-6);
+}
+
+// ---- Throws: message, source, line, and nothing changed ----
+
+void expectRuntimeError(const std::function<void()>& call, const char* message, const char* file, int line) {
+  try {
+    call();
+    ADD_FAILURE() << "no throw";
+  } catch (const Kv::Exception::RuntimeError& e) {
+    EXPECT_STREQ(e.getMessage(), message);
+    EXPECT_STREQ(e.getFile(), file);
+    EXPECT_EQ(e.getLine(), line);
+    EXPECT_STREQ(e.getTypeName(), "RuntimeError");
   }
 }
 
-TEST(BiquadDesign, PublishedLowPassExample) {
-  Biquad b(Biquad::LowPass, 1000.0f, 48000.0f, Shape(Shape::Q, 0.7071f), 0.0, true);
-  const float* c = BiquadAccess::coefficients(b);
-  const float want[5] = {0.003916123f, 0.007832247f, 0.003916123f, -1.815340f, 0.8310041f};
-  for (int i = 0; i < 5; ++i) EXPECT_NEAR(c[i], want[i], std::abs(want[i]) * 2e-6) << i;
-  EXPECT_NEAR(b.getResponseMagnitudeAtFrequency(0.0f), 1.0f, 1e-6);
-  EXPECT_NEAR(b.getResponseMagnitudeAtFrequency(1000.0f / 24000.0f), 0.7071f, 1e-4);
-  EXPECT_NEAR(b.getResponseMagnitudeAtFrequency(1.0f), 0.0f, 1e-6);
-}
-
-// ---- Throws ----
-
-struct ThrowCase {
-  const char* name;
-  std::function<void(Biquad&)> call;
-  const char* message;
-  int line;
-};
-
-TEST(BiquadThrows, MessageSourceLineAndNothingChanged) {
-  const auto mismatch = "ShapeDescriptor/FilterType mismatch";
-  const auto configureWith = [](int type, Shape shape) {
-    return [=](Biquad& b) { b.configure(typeAt(type), 500.0f, 48000.0f, shape, 3.0); };
-  };
-  const ThrowCase cases[] = {
-      {"low shelf with a bandwidth", configureWith(8, Shape(Shape::Bandwidth, 1.0f)), mismatch, 133},
-      {"high shelf with no shape", configureWith(9, Shape()), mismatch, 133},
-      {"low-pass with a slope", configureWith(1, Shape(Shape::S, 1.0f)), mismatch, 116},
-      {"peaking with no shape", configureWith(7, Shape()), mismatch, 116},
-      {"all-pass with a slope", configureWith(6, Shape(Shape::S, 0.5f)), mismatch, 116},
+TEST(BiquadThrows, ConfigureWithAMismatchedShapeOrAnUnknownType) {
+  const char* mismatch = "ShapeDescriptor/FilterType mismatch";
+  const char* unknown = "Unknown filter type";
+  const struct {
+    int type;
+    Shape shape;
+    const char* message;
+    int line;
+  } cases[] = {
+      {8, Shape(Shape::Bandwidth, 1.0f), mismatch, 133},  // low shelf with a bandwidth
+      {9, Shape(), mismatch, 133},
+      {1, Shape(Shape::S, 1.0f), mismatch, 116},  // low-pass with a slope
+      {7, Shape(), mismatch, 116},
+      {6, Shape(Shape::S, 0.5f), mismatch, 116},
       // Outside the enumeration, the shelf's shape test comes first.
-      {"type 10 with a bandwidth", configureWith(10, Shape(Shape::Bandwidth, 1.0f)), mismatch, 188},
-      {"no filter with no shape", configureWith(0, Shape()), mismatch, 188},
-      {"no filter with a Q", configureWith(0, Shape(Shape::Q, 1.0f)), "Unknown filter type", 267},
-      {"type -1 with a slope", configureWith(-1, Shape(Shape::S, 1.0f)), "Unknown filter type", 267},
-      {"type 10 with a Q", configureWith(10, Shape(Shape::Q, 1.0f)), "Unknown filter type", 267},
+      {10, Shape(Shape::Bandwidth, 1.0f), mismatch, 188},
+      {0, Shape(), mismatch, 188},
+      {0, Shape(Shape::Q, 1.0f), unknown, 267},
+      {-1, Shape(Shape::S, 1.0f), unknown, 267},
+      {10, Shape(Shape::Q, 1.0f), unknown, 267},
   };
   std::mt19937 rng(7);
-  for (const ThrowCase& c : cases) {
-    SCOPED_TRACE(c.name);
+  for (const auto& c : cases)
     for (bool configured : {false, true}) {
+      SCOPED_TRACE(testing::Message()
+                   << "type " << c.type << " shape " << c.shape.getType() << " " << configured);
       Biquad b;
       if (configured) {
         configureRandomly(b, Biquad::PeakingEQ, rng);
@@ -151,63 +132,28 @@ TEST(BiquadThrows, MessageSourceLineAndNothingChanged) {
         for (int i = 0; i < 5; ++i) b.processSample(float(i) - 2.0f);
       }
       const StateBits before = stateOf(b);
-      try {
-        c.call(b);
-        ADD_FAILURE() << "no throw";
-      } catch (const Kv::Exception::RuntimeError& e) {
-        EXPECT_STREQ(e.getMessage(), c.message);
-        EXPECT_STREQ(e.getFile(), "Aud__Biquad");
-        EXPECT_EQ(e.getLine(), c.line);
-        EXPECT_STREQ(e.getTypeName(), "RuntimeError");
-      }
+      expectRuntimeError([&] { b.configure(typeAt(c.type), 500.0f, 48000.0f, c.shape, 3.0); }, c.message,
+                         "Aud__Biquad", c.line);
       EXPECT_TRUE(stateOf(b) == before);
     }
-  }
 }
 
-TEST(BiquadThrows, SwitchingAndResponseOfAnUnconfiguredFilter) {
+TEST(BiquadThrows, SwitchingOnUnconfiguredAndBandOutOfRange) {
   Biquad b;
-  b.setActive(false);  // always allowed
-  EXPECT_FALSE(b.getActive());
+  b.setActive(false);                                        // always allowed
   EXPECT_EQ(b.getResponseMagnitudeAtFrequency(0.3f), 1.0f);  // inactive: flat, configured or not
-  try {
-    b.setActive(true);
-    ADD_FAILURE() << "no throw";
-  } catch (const Kv::Exception::RuntimeError& e) {
-    EXPECT_STREQ(e.getMessage(), "Filter is not configured!");
-    EXPECT_STREQ(e.getFile(), "Aud__Biquad");
-    EXPECT_EQ(e.getLine(), 315);
-  }
+  expectRuntimeError([&] { b.setActive(true); }, "Filter is not configured!", "Aud__Biquad", 315);
   EXPECT_FALSE(b.getActive());
   // The six-argument constructor switches on through the same check.
-  try {
-    Biquad c(Biquad::NoFilter, 1000.0f, 48000.0f, Shape(Shape::Q, 1.0f), 0.0, true);
-    ADD_FAILURE() << "no throw";
-  } catch (const Kv::Exception::RuntimeError& e) {
-    EXPECT_EQ(e.getLine(), 267);
-  }
-  Biquad configuredButOff(Biquad::Notch, 1000.0f, 48000.0f, Shape(Shape::Q, 1.0f), 0.0, false);
-  EXPECT_FALSE(configuredButOff.getActive());
-  EXPECT_EQ(configuredButOff.getResponseMagnitudeAtFrequency(1000.0f / 24000.0f), 1.0f);
-}
+  expectRuntimeError([] { Biquad(Biquad::NoFilter, 1000.0f, 48000.0f, Shape(Shape::Q, 1.0f), 0.0, true); },
+                     "Unknown filter type", "Aud__Biquad", 267);
 
-TEST(BiquadThrows, BandIndexOutOfRange) {
   MultiBandBiquad<3> chain;
   const MultiBandBiquad<3>& readOnly = chain;
-  EXPECT_EQ(&chain.getBand(2), &readOnly.getBand(2));
-  const std::function<void()> calls[] = {[&] { chain.getBand(3); }, [&] { readOnly.getBand(3); },
-                                         [&] { chain.getBand(0xFFFFFFFFu); }};
-  const int lines[] = {206, 214, 206};
-  for (int i = 0; i < 3; ++i) {
-    try {
-      calls[i]();
-      ADD_FAILURE() << "no throw " << i;
-    } catch (const Kv::Exception::RuntimeError& e) {
-      EXPECT_STREQ(e.getMessage(), "BandNumber out of range!");
-      EXPECT_STREQ(e.getFile(), "tonebits/Aud__Biquad");
-      EXPECT_EQ(e.getLine(), lines[i]);
-    }
-  }
+  const char* band = "BandNumber out of range!";
+  expectRuntimeError([&] { chain.getBand(3); }, band, "tonebits/Aud__Biquad", 206);
+  expectRuntimeError([&] { readOnly.getBand(3); }, band, "tonebits/Aud__Biquad", 214);
+  expectRuntimeError([&] { chain.getBand(0xFFFFFFFFu); }, band, "tonebits/Aud__Biquad", 206);
 }
 
 // ---- Sample by sample ----
@@ -223,8 +169,8 @@ TEST(BiquadProcess, DirectFormOneInSinglePrecision) {
     for (float x : signal(64, Salt::kClean, rng)) {
       const float y = (((c[0] * x + c[1] * x1) + c[2] * x2) - c[3] * y1) - c[4] * y2;
       ASSERT_EQ(bitsOf(b.processSample(x)), bitsOf(y)) << t;
-      x2 = x1, x1 = x, y2 = y1, y1 = y;
       ASSERT_EQ(bitsOf(b.getLastProcessSampleResult()), bitsOf(y));
+      x2 = x1, x1 = x, y2 = y1, y1 = y;
     }
   }
 }
@@ -237,14 +183,12 @@ TEST(BiquadProcess, InactivePassesAndRecordsOnlyTheLastInput) {
   b.setActive(false);
   EXPECT_EQ(bitsOf(b.processSample(-0.0f)), bitsOf(-0.0f));
   EXPECT_EQ(b.processSample(0.75f), 0.75f);
-  EXPECT_EQ(b.getLastProcessSampleResult(), 0.75f);
   const auto after = BiquadAccess::history(b);
-  EXPECT_EQ(after.x1, before.x1);
-  EXPECT_EQ(after.x2, before.x2);
-  EXPECT_EQ(after.y2, before.y2);
+  EXPECT_EQ(after.y1, 0.75f);
+  EXPECT_TRUE(after.x1 == before.x1 && after.x2 == before.x2 && after.y2 == before.y2);
   b.reset();
   const auto cleared = BiquadAccess::history(b);
-  EXPECT_EQ(cleared.x1 + cleared.x2 + cleared.y1 + cleared.y2, 0.0f);
+  EXPECT_TRUE(cleared.x1 == 0 && cleared.x2 == 0 && cleared.y1 == 0 && cleared.y2 == 0);
   // Reconfiguring keeps the history and the switch.
   b.processSample(0.5f);
   b.setActive(true);
@@ -258,12 +202,11 @@ TEST(BiquadProcess, InactivePassesAndRecordsOnlyTheLastInput) {
 TEST(BiquadResponse, KnownValuesAtDcCentreAndNyquist) {
   const float fs = 48000.0f, f0 = 3000.0f, centre = f0 / (fs / 2);
   const double g = 9.0, linear = std::pow(10.0, g / 20.0);
-  struct Row {
+  const struct {
     Biquad::eFilterType type;
     Shape shape;
     double dc, atCentre, nyquist;
-  };
-  const Row rows[] = {
+  } rows[] = {
       {Biquad::LowPass, Shape(Shape::Q, 0.7071f), 1.0, 0.7071, 0.0},
       {Biquad::HighPass, Shape(Shape::Q, 0.7071f), 0.0, 0.7071, 1.0},
       {Biquad::BandPassSkirt, Shape(Shape::Q, 3.0f), 0.0, 3.0, 0.0},
@@ -274,7 +217,7 @@ TEST(BiquadResponse, KnownValuesAtDcCentreAndNyquist) {
       {Biquad::LowShelf, Shape(Shape::S, 1.0f), linear, std::sqrt(linear), 1.0},
       {Biquad::HighShelf, Shape(Shape::S, 1.0f), 1.0, std::sqrt(linear), linear},
   };
-  for (const Row& r : rows) {
+  for (const auto& r : rows) {
     SCOPED_TRACE(r.type);
     Biquad b(r.type, f0, fs, r.shape, g, true);
     EXPECT_NEAR(b.getResponseMagnitudeAtFrequency(0.0f), r.dc, 1e-5 * (1 + r.dc));
@@ -285,60 +228,28 @@ TEST(BiquadResponse, KnownValuesAtDcCentreAndNyquist) {
   EXPECT_NEAR(peak.getResponseMagnitudeAtFrequency(1000.0f / 24000.0f), 1.995262f, 2e-6);
 }
 
-// The response formula against what the filter does: the DFT of its impulse
-// response, for every type with random settings.
-TEST(BiquadResponse, MatchesTheSpectrumOfTheImpulseResponse) {
-  std::mt19937 rng(5);
-  const double pi = std::acos(-1.0);
-  for (int t = 1; t <= 9; ++t)
-    for (int trial = 0; trial < 2; ++trial) {
-      Biquad b;
-      configureRandomly(b, typeAt(t), rng);
-      // Keep the poles away from the unit circle, where float coefficients
-      // move the response measurably and 8k samples would not hold it all.
-      b.configure(b.getFilterType(), std::max(b.getFrequency(), 1000.0f), b.getSamplingRate(),
-                  b.getShapeDescriptor().getValue() > 3.0f ? Shape(b.getShapeDescriptor().getType(), 3.0f)
-                                                           : b.getShapeDescriptor(),
-                  b.getGain());
-      b.setActive(true);
-      std::vector<double> h(8192);
-      for (size_t n = 0; n < h.size(); ++n) h[n] = b.processSample(n == 0 ? 1.0f : 0.0f);
-      for (float f : {0.0f, 0.01f, 0.05f, 0.1f, 0.2f, 0.33f, 0.5f, 0.7f, 0.9f, 1.0f}) {
-        std::complex<double> sum = 0, turn = 1;
-        const std::complex<double> step = std::polar(1.0, -pi * f);
-        for (size_t n = 0; n < h.size(); ++n, turn *= step) sum += h[n] * turn;
-        const double want = std::abs(sum);
-        EXPECT_NEAR(b.getResponseMagnitudeAtFrequency(f), want, 2e-4 * (1.0 + want))
-            << "type " << t << " f " << f << " fc " << b.getFrequency();
-      }
-    }
-}
-
-TEST(MultiBandResponse, ProductOfTheActiveBands) {
+TEST(MultiBand, ResponseIsTheProductOfTheActiveBands) {
   MultiBandBiquad<4> chain;
   for (float f : {0.0f, 0.25f, 1.0f}) EXPECT_EQ(chain.getResponseMagnitudeAtFrequency(f), 1.0f);
   for (float x : {0.5f, -1.0f, 3e38f}) EXPECT_EQ(chain.processSample(x), x);
-
   // Opposite peaks cancel at their centre.
-  chain.getBand(1).configure(Biquad::PeakingEQ, 2000.0f, 48000.0f, Shape(Shape::Q, 2.0f), 6.0);
-  chain.getBand(3).configure(Biquad::PeakingEQ, 2000.0f, 48000.0f, Shape(Shape::Q, 2.0f), -6.0);
-  chain.getBand(1).setActive(true);
-  chain.getBand(3).setActive(true);
+  for (unsigned k : {1u, 3u}) {
+    chain.getBand(k).configure(Biquad::PeakingEQ, 2000.0f, 48000.0f, Shape(Shape::Q, 2.0f),
+                               k == 1 ? 6.0 : -6.0);
+    chain.getBand(k).setActive(true);
+  }
   EXPECT_NEAR(chain.getResponseMagnitudeAtFrequency(2000.0f / 24000.0f), 1.0f, 1e-6);
-
   // Configured but inactive bands do not count.
   chain.getBand(0).configure(Biquad::LowPass, 500.0f, 48000.0f, Shape(Shape::Q, 0.7f), 0.0);
   chain.getBand(3).setActive(false);
-  const float f = 0.3f;
-  EXPECT_EQ(chain.getResponseMagnitudeAtFrequency(f),
-            1.0f * chain.getBand(1).getResponseMagnitudeAtFrequency(f));
+  const float f = 0.3f, r1 = chain.getBand(1).getResponseMagnitudeAtFrequency(f);
+  EXPECT_EQ(chain.getResponseMagnitudeAtFrequency(f), 1.0f * r1);
   chain.getBand(0).setActive(true);
   EXPECT_EQ(chain.getResponseMagnitudeAtFrequency(f),
-            (1.0f * chain.getBand(0).getResponseMagnitudeAtFrequency(f)) *
-                chain.getBand(1).getResponseMagnitudeAtFrequency(f));
+            (1.0f * chain.getBand(0).getResponseMagnitudeAtFrequency(f)) * r1);
 }
 
-TEST(MultiBandProcess, LastResultIsTheChainOutputEvenWithTheLastBandOff) {
+TEST(MultiBand, LastResultIsTheChainOutputEvenWithTheLastBandOff) {
   MultiBandBiquad<2> chain;
   chain.getBand(0).configure(Biquad::LowPass, 500.0f, 48000.0f, Shape(Shape::Q, 0.7f), 0.0);
   chain.getBand(0).setActive(true);
@@ -347,11 +258,8 @@ TEST(MultiBandProcess, LastResultIsTheChainOutputEvenWithTheLastBandOff) {
     EXPECT_EQ(chain.getLastProcessSampleResult(), y);
     EXPECT_EQ(chain.getBand(1).getLastProcessSampleResult(), y);
   }
-  MultiBandBiquad<2> copy = chain;
-  EXPECT_EQ(copy.processSample(0.25f), chain.processSample(0.25f));
   chain.reset();
   EXPECT_EQ(chain.getLastProcessSampleResult(), 0.0f);
-  EXPECT_NE(copy.getLastProcessSampleResult(), 0.0f);
 }
 
 }  // namespace

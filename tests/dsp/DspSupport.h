@@ -1,7 +1,9 @@
-// Helpers shared by the filter tests: bit views of filter state and random
-// filter settings.
+// Helpers shared by the dsp tests: bit views, SIMD levels, filter state and
+// random filter settings.
 #pragma once
 
+#include <array>
+#include <bit>
 #include <cmath>
 #include <cstdint>
 #include <cstring>
@@ -12,86 +14,75 @@
 
 #include "tonebits/dsp/Aud__Biquad.h"
 #include "tonebits/dsp/Aud__BiquadCascade.h"
+#include "tonebits/foundation/Aud__Simd.h"
 
-namespace biquad_test {
+namespace dsp_test {
 
 using Aud::Filter::Biquad;
 using Aud::Filter::BiquadAccess;
 using Shape = Biquad::ShapeDescriptor;
 
-inline uint32_t bitsOf(float v) {
-  uint32_t u;
-  std::memcpy(&u, &v, 4);
-  return u;
-}
-inline float floatOf(uint32_t u) {
-  float v;
-  std::memcpy(&v, &u, 4);
+inline uint32_t bitsOf(float v) { return std::bit_cast<uint32_t>(v); }
+inline float floatOf(uint32_t u) { return std::bit_cast<float>(u); }
+
+// Every level this CPU runs, scalar first.
+inline std::vector<Aud::Simd::eLevel> levels() {
+  std::vector<Aud::Simd::eLevel> v;
+  for (int l = Aud::Simd::eScalar; l <= Aud::Simd::supportedLevel(); ++l) v.push_back(Aud::Simd::eLevel(l));
   return v;
 }
+
+struct LevelGuard {
+  Aud::Simd::eLevel saved = Aud::Simd::activeLevel();
+  ~LevelGuard() { Aud::Simd::setActiveLevel(saved); }
+};
 
 // Everything a filter holds, as bits, so that two filters compare equal only
 // when they would behave identically from here on.
 struct StateBits {
   bool active;
-  uint32_t coefficients[5];
-  uint64_t raw[6];
-  uint32_t history[4];
-  int32_t type;
-  uint32_t frequency, samplingRate;
-  int32_t shapeType;
-  uint32_t shapeValue;
-  uint64_t gain;
+  uint32_t coefficients[5], history[4], frequency, samplingRate, shapeValue;
+  uint64_t raw[6], gain;
+  int32_t type, shapeType;
   bool operator==(const StateBits&) const = default;
 };
 
 inline StateBits stateOf(Biquad& b) {
+  static_assert(sizeof(BiquadAccess::History) == 16);
   StateBits s{};
   s.active = b.getActive();
   std::memcpy(s.coefficients, BiquadAccess::coefficients(b), sizeof(s.coefficients));
   std::memcpy(s.raw, BiquadAccess::rawCoefficients(b), sizeof(s.raw));
-  const auto& h = BiquadAccess::history(b);
-  s.history[0] = bitsOf(h.x1);
-  s.history[1] = bitsOf(h.x2);
-  s.history[2] = bitsOf(h.y1);
-  s.history[3] = bitsOf(h.y2);
+  std::memcpy(s.history, &BiquadAccess::history(b), sizeof(s.history));
   s.type = b.getFilterType();
   s.frequency = bitsOf(b.getFrequency());
   s.samplingRate = bitsOf(b.getSamplingRate());
   s.shapeType = b.getShapeDescriptor().getType();
   s.shapeValue = bitsOf(b.getShapeDescriptor().getValue());
-  const double g = b.getGain();
-  std::memcpy(&s.gain, &g, 8);
+  s.gain = std::bit_cast<uint64_t>(b.getGain());
   return s;
-}
-
-// A valid, stable design of the given type with random parameters.
-inline void configureRandomly(Biquad& b, Biquad::eFilterType type, std::mt19937& rng) {
-  std::uniform_real_distribution<float> logFreq(3.0f, 9.9f);  // e^3 = 20 Hz .. e^9.9 = 20 kHz
-  std::uniform_real_distribution<float> unit(0.0f, 1.0f);
-  const float rates[] = {44100.0f, 48000.0f, 96000.0f};
-  const float rate = rates[rng() % 3];
-  const float frequency = std::exp(logFreq(rng));
-  const double gain = double(unit(rng)) * 30.0 - 15.0;
-  Shape shape;
-  if (type == Biquad::LowShelf || type == Biquad::HighShelf) {
-    if (rng() % 2)
-      shape.setAsQ(0.3f + 2.0f * unit(rng));
-    else
-      shape.setAsS(0.2f + 0.8f * unit(rng));
-  } else {
-    if (rng() % 2)
-      shape.setAsQ(0.3f + 6.0f * unit(rng));
-    else
-      shape.setAsBandwidth(0.1f + 2.5f * unit(rng));
-  }
-  b.configure(type, frequency, rate, shape, gain);
 }
 
 inline Biquad::eFilterType typeAt(int i) { return static_cast<Biquad::eFilterType>(i); }
 
+// A valid, stable design of the given type with random parameters.
+inline void configureRandomly(Biquad& b, Biquad::eFilterType type, std::mt19937& rng) {
+  std::uniform_real_distribution<float> logFreq(3.0f, 9.9f);  // 20 Hz .. 20 kHz
+  std::uniform_real_distribution<float> unit(0.0f, 1.0f);
+  const float rate = std::array{44100.0f, 48000.0f, 96000.0f}[rng() % 3], frequency = std::exp(logFreq(rng));
+  const double gain = double(unit(rng)) * 30.0 - 15.0;
+  Shape shape;
+  if (type == Biquad::LowShelf || type == Biquad::HighShelf)
+    rng() % 2 ? shape.setAsQ(0.3f + 2.0f * unit(rng)) : shape.setAsS(0.2f + 0.8f * unit(rng));
+  else
+    rng() % 2 ? shape.setAsQ(0.3f + 6.0f * unit(rng)) : shape.setAsBandwidth(0.1f + 2.5f * unit(rng));
+  b.configure(type, frequency, rate, shape, gain);
+}
+
 // Input salted with the values that break careless kernels.
 enum class Salt { kClean, kDenormal, kNaN, kInfinity, kNegativeZero, kLoud };
+inline constexpr Salt kSalts[] = {Salt::kClean,    Salt::kDenormal,     Salt::kNaN,
+                                  Salt::kInfinity, Salt::kNegativeZero, Salt::kLoud};
 
 inline std::vector<float> signal(unsigned count, Salt salt, std::mt19937& rng) {
   std::uniform_real_distribution<float> d(-1.0f, 1.0f);
@@ -122,22 +113,16 @@ inline std::vector<float> signal(unsigned count, Salt salt, std::mt19937& rng) {
   return v;
 }
 
-inline constexpr Salt kSalts[] = {Salt::kClean,    Salt::kDenormal,     Salt::kNaN,
-                                  Salt::kInfinity, Salt::kNegativeZero, Salt::kLoud};
-
-// memcmp of the two blocks; on a difference, where it is and the two bit
-// patterns, for the failure message.
+// memcmp of the two blocks; on a difference, where and the two bit patterns.
 inline testing::AssertionResult sameBits(const std::vector<float>& got, const std::vector<float>& want) {
-  if (got.size() == want.size() &&
-      (got.empty() || std::memcmp(got.data(), want.data(), got.size() * sizeof(float)) == 0))
-    return testing::AssertionSuccess();
   if (got.size() != want.size())
     return testing::AssertionFailure() << "sizes " << got.size() << " " << want.size();
+  if (got.empty() || std::memcmp(got.data(), want.data(), got.size() * sizeof(float)) == 0)
+    return testing::AssertionSuccess();
   size_t i = 0;
   while (bitsOf(got[i]) == bitsOf(want[i])) ++i;
   return testing::AssertionFailure() << "sample " << i << " of " << got.size() << ": got " << std::hex
-                                     << bitsOf(got[i]) << " (" << got[i] << "), want " << bitsOf(want[i])
-                                     << " (" << want[i] << ")";
+                                     << bitsOf(got[i]) << ", want " << bitsOf(want[i]);
 }
 
-}  // namespace biquad_test
+}  // namespace dsp_test
