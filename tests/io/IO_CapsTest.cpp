@@ -11,154 +11,98 @@
 namespace {
 
 using namespace Aud;
+using Texts = std::vector<std::string>;
 
-class FatalReports {
- public:
+struct FatalReports {
+  Texts got;
   FatalReports() {
-    host::setFatalReportHandler([this](const char* m) { messages_.push_back(m); });
+    host::setFatalReportHandler([&](const char* m) { got.push_back(m); });
   }
   ~FatalReports() { host::setFatalReportHandler(nullptr); }
-  std::vector<std::string> take() { return std::exchange(messages_, {}); }
-
- private:
-  std::vector<std::string> messages_;
+  Texts take() { return std::exchange(got, {}); }
 };
 
-IO_ConnectionTypeInfo::Rep record(eIO_ConnectionClass connectionClass, eIO_ConnectionType type,
-                                  bool src = false, bool absolute = true, double lower = 0.0,
-                                  double upper = 0.0) {
-  return IO_ConnectionTypeInfo::Rep{
-      true, -12.5, 6.0, absolute, lower, upper, src, String("SRC text"), connectionClass, type};
+IO_ConnectionTypeInfo::Rep record(eIO_ConnectionClass cc, eIO_ConnectionType type, bool src = false,
+                                  bool absolute = true, double lower = 0, double upper = 0) {
+  return {true, -12.5, 6.0, absolute, lower, upper, src, String("SRC text"), cc, type};
+}
+IO_ConnectionTypeInfo info(const IO_ConnectionTypeInfo::Rep& rep) {
+  return IO_CapsFactory::makeConnectionTypeInfo(rep);
 }
 
-const SampleRate k32(sr32000, fNone), k44(sr44100, fNone), k48(sr48000, fNone), k96(sr96000, fNone);
-
-TEST(IO_ConnectionTypeInfo, CopiesShareTheRecord) {
+TEST(IO_ConnectionTypeInfo, CopiesShareTheRecordAndAnInvalidOneReportsEveryQueryButType) {
   const IO_ConnectionTypeInfo::Rep rep = record(ccMixer, ctADAT, true);
   IO_ConnectionTypeInfo copy;
-  copy = IO_CapsFactory::makeConnectionTypeInfo(rep);
+  copy = info(rep);
   EXPECT_TRUE(copy.supportsGainControl() && copy.supportsSRC() && copy.isMixer());
   EXPECT_FALSE(copy.isAnalogue() || copy.isDigital());
-  EXPECT_EQ(copy.mininumGain(), -12.5);
-  EXPECT_EQ(copy.maximumGain(), 6.0);
-  EXPECT_EQ(copy.type(), ctADAT);
+  EXPECT_TRUE(copy.mininumGain() == -12.5 && copy.maximumGain() == 6.0);
   EXPECT_EQ(copy.getDisplayString(), L"ADAT");
   EXPECT_EQ(copy.getSRCDisplayString(), L"SRC text");
-}
 
-TEST(IO_ConnectionTypeInfo, AnInvalidInfoReportsEveryQueryButType) {
   FatalReports reports;
-  const IO_ConnectionTypeInfo info;
-  EXPECT_EQ(info.type(), ctNone);
+  const IO_ConnectionTypeInfo invalid = IO_CapsFactory::makeConnectionTypeInfo(nullptr);
+  EXPECT_TRUE(invalid.type() == ctNone && IO_ConnectionTypeInfo().type() == ctNone);
   EXPECT_TRUE(reports.take().empty());
-  EXPECT_EQ(IO_CapsFactory::makeConnectionTypeInfo(nullptr).type(), ctNone);
-
-  EXPECT_FALSE(info.supportsGainControl());
-  EXPECT_EQ(info.mininumGain(), 0.0);
-  EXPECT_EQ(info.maximumGain(), 0.0);
-  EXPECT_FALSE(info.supportsSRC());
-  EXPECT_EQ(info.getConnectionClass(), 0);
-  EXPECT_FALSE(info.isAnalogue());
-  EXPECT_FALSE(info.isDigital());
-  EXPECT_FALSE(info.isMixer());
-  EXPECT_FALSE(info.supportsSRC(k48, k48));
-  EXPECT_EQ(info.getDisplayString(), L"Invalid");
-  EXPECT_EQ(info.getSRCDisplayString(), L"");
-  const std::vector<std::string> messages = reports.take();
-  EXPECT_EQ(messages.size(), 11u);
-  for (const std::string& m : messages) EXPECT_EQ(m, "Method called on invalid IO_ConnectionTypeInfo object");
+  EXPECT_FALSE(invalid.supportsGainControl() || invalid.supportsSRC() || invalid.isAnalogue() ||
+               invalid.isDigital() || invalid.isMixer() ||
+               invalid.supportsSRC({sr48000, fNone}, {sr48000, fNone}));
+  EXPECT_EQ(invalid.mininumGain() + invalid.maximumGain(), 0.0);
+  EXPECT_EQ(invalid.getConnectionClass(), 0);
+  EXPECT_EQ(invalid.getDisplayString(), L"Invalid");
+  EXPECT_EQ(invalid.getSRCDisplayString(), L"");
+  EXPECT_EQ(reports.take(), Texts(11, "Method called on invalid IO_ConnectionTypeInfo object"));
 }
 
-TEST(IO_ConnectionTypeInfo, SupportsSRC) {
-  const IO_ConnectionTypeInfo::Rep absolute = record(ccDigital, ctAES_EBU, true, true, 44100.0, 48000.0);
-  const IO_ConnectionTypeInfo::Rep relative = record(ccDigital, ctSPDIF, true, false, 0.1, 0.1);
-  const IO_ConnectionTypeInfo::Rep noSrc = record(ccDigital, ctSDI, false, true, 0.0, 1e9);
-  const IO_ConnectionTypeInfo::Rep analogue = record(ccAnalogue, ctAnalogue, false);
-  const IO_ConnectionTypeInfo::Rep mixer = record(ccMixer, ctNone, false);
-  const IO_ConnectionTypeInfo::Rep nanBounds = record(ccDigital, ctAES_EBU, true, false, NAN, 0.1);
+TEST(IO_ConnectionTypeInfo, SupportsSRCWithinInclusiveBounds) {
+  // In Hz: 32000, 44100, 48000, 96000, 48048, 47952.05, 50000, 42336, 24000, 25000, 96000, 96096, none.
+  const SampleRate rates[] = {
+      {sr32000, fNone},    {sr44100, fNone},        {sr48000, fNone},   {sr96000, fNone}, {sr48000, fx1001},
+      {sr48000, fx1_1001}, {sr48000, fx25_24},      {sr44100, fx24_25}, {sr48000, fx1_2}, {sr24000, fx25_24},
+      {sr48000, fx2},      {sr48000, fx2 | fx1001}, {srNone, fNone}};
+  // Absolute bounds ignore the reference: 44100 to 48000 Hz at 48 or 96 kHz. Relative ones are 43200 to
+  // 52800 Hz at 48 kHz, 21600 to 26400 Hz at 24 kHz, and 24000 to 96000 Hz at 48 kHz, inclusive.
   const struct {
-    const IO_ConnectionTypeInfo::Rep& rep;
-    SampleRate reference, rate;
-    bool supported;
-  } rows[] = {
-      {absolute, k32, k48, true},
-      {absolute, k96, k44, true},  // absolute bounds ignore the reference
-      {absolute, k48, k96, false},
-      {absolute, k48, k32, false},
-      {absolute, k48, SampleRate(sr48000, fx1001), false},  // 48048 Hz
-      {absolute, k48, SampleRate(sr48000, fx1_1001), true},
-      {relative, k48, k44, true},  // 43200 to 52800 Hz
-      {relative, k48, k48, true},
-      {relative, k48, k32, false},
-      {relative, k48, k96, false},
-      {relative, k48, SampleRate(sr48000, fx25_24), true},   // 50000 Hz
-      {relative, k48, SampleRate(sr44100, fx24_25), false},  // 42336 Hz
-      {relative, SampleRate(sr24000, fNone), SampleRate(sr24000, fx25_24), true},
-      {noSrc, k48, k48, false},
-      {analogue, k48, k96, true},
-      {analogue, k48, SampleRate(), true},
-      {mixer, k48, SampleRate(), true},
-      {absolute, k48, SampleRate(), false},
-      {nanBounds, k48, k48, false}  // 0 Hz
-  };
+    IO_ConnectionTypeInfo::Rep rep;
+    SampleRate reference;
+    const char* supported;
+  } rows[] = {{record(ccDigital, ctAES_EBU, true, true, 44100.0, 48000.0), {sr48000, fNone}, "-++--+-------"},
+              {record(ccDigital, ctAES_EBU, true, true, 44100.0, 48000.0), {sr96000, fNone}, "-++--+-------"},
+              {record(ccDigital, ctSPDIF, true, false, 0.1, 0.1), {sr48000, fNone}, "-++-+++------"},
+              {record(ccDigital, ctSPDIF, true, false, 0.1, 0.1), {sr24000, fNone}, "--------++---"},
+              {record(ccDigital, ctHDMI, true, false, 0.5, 1.0), {sr48000, fNone}, "+++++++++++--"},
+              {record(ccDigital, ctSDI, false, true, 0.0, 1e9), {sr48000, fNone}, "-------------"},
+              {record(ccAnalogue, ctAnalogue), {sr48000, fNone}, "+++++++++++++"},
+              {record(ccMixer, ctNone), {sr48000, fNone}, "+++++++++++++"},
+              {record(ccDigital, ctAES_EBU, true, false, NAN, 0.1), {sr48000, fNone}, "-------------"}};
   for (const auto& row : rows) {
-    SCOPED_TRACE(testing::Message() << row.reference.calcCombinedSampleRate() << " -> "
-                                    << row.rate.calcCombinedSampleRate());
-    EXPECT_EQ(IO_CapsFactory::makeConnectionTypeInfo(row.rep).supportsSRC(row.reference, row.rate),
-              row.supported);
+    std::string got;
+    for (const SampleRate& rate : rates) got += info(row.rep).supportsSRC(row.reference, rate) ? '+' : '-';
+    EXPECT_EQ(got, row.supported) << row.rep.connectionType << " at "
+                                  << row.reference.calcCombinedSampleRate();
   }
-  // The bounds are inclusive.
-  const IO_ConnectionTypeInfo::Rep exact = record(ccDigital, ctHDMI, true, false, 0.5, 1.0);
-  EXPECT_TRUE(IO_CapsFactory::makeConnectionTypeInfo(exact).supportsSRC(k48, SampleRate(sr48000, fx1_2)));
-  EXPECT_TRUE(IO_CapsFactory::makeConnectionTypeInfo(exact).supportsSRC(k48, SampleRate(sr48000, fx2)));
-  EXPECT_FALSE(
-      IO_CapsFactory::makeConnectionTypeInfo(exact).supportsSRC(k48, SampleRate(sr48000, fx2 | fx1001)));
 }
 
-TEST(IO_SyncSourceTypeInfo, RecordAndInvalidInfo) {
-  const IO_SyncSourceTypeInfo::Rep rep{3, ssLTC};
-  const IO_SyncSourceTypeInfo info = IO_CapsFactory::makeSyncSourceTypeInfo(rep);
-  EXPECT_EQ(info.numInputs(), 3u);
-  EXPECT_EQ(info.type(), ssLTC);
+TEST(IO_DisplayStrings, TypesAndSyncSourcesIncludingUnknownValuesAndSyncSourceValues) {
+  const std::pair<int, const wchar_t*> connections[] = {{2, L"Analogue"}, {3, L"AES/EBU"},  {4, L"1394"},
+                                                        {5, L"ADAT"},     {6, L"S/PDIF"},   {7, L"SDI"},
+                                                        {9, L"HDMI"},     {8, L"Invalid"},  {0, L"Invalid"},
+                                                        {1, L"Invalid"},  {10, L"Invalid"}, {-2, L"Invalid"}};
+  const std::pair<int, const wchar_t*> syncs[] = {
+      {1, L"Free Running"}, {2, L"Video"}, {3, L"LTC"}, {4, L"AES/EBU"}, {0, L""}, {5, L""}, {-1, L""},
+      {1000, L""}};
   FatalReports reports;
-  const IO_SyncSourceTypeInfo invalid;
-  EXPECT_EQ(invalid.type(), ssNone);
+  for (const auto& [type, text] : connections)
+    EXPECT_EQ(getDisplayString(eIO_ConnectionType(type)), text) << type;
   EXPECT_TRUE(reports.take().empty());
-  EXPECT_EQ(invalid.numInputs(), 0u);
-  EXPECT_EQ(reports.take(),
-            std::vector<std::string>{"Method called on invalid IO_SyncSourceTypeInfo object"});
-}
-
-TEST(IO_DisplayStrings, ConnectionTypes) {
-  const struct {
-    int type;
-    const wchar_t* text;
-  } rows[] = {{2, L"Analogue"}, {3, L"AES/EBU"}, {4, L"1394"},     {5, L"ADAT"},
-              {6, L"S/PDIF"},   {7, L"SDI"},     {9, L"HDMI"},     {8, L"Invalid"},
-              {0, L"Invalid"},  {1, L"Invalid"}, {10, L"Invalid"}, {-2, L"Invalid"}};
-  FatalReports reports;
-  for (const auto& row : rows)
-    EXPECT_EQ(getDisplayString(eIO_ConnectionType(row.type)), row.text) << row.type;
-  EXPECT_TRUE(reports.take().empty());
+  for (const auto& [type, text] : syncs) {
+    EXPECT_EQ(getDisplayString(eIO_SyncSourceType(type)), text) << type;
+    EXPECT_EQ(reports.take(), *text ? Texts{} : Texts{"Dodgy enum!"}) << type;
+  }
   host::setResourceText(2081, L"SDI (embedded)");
   EXPECT_EQ(getDisplayString(ctSDI), L"SDI (embedded)");
   host::setResourceText(2081, L"SDI");
-}
 
-TEST(IO_DisplayStrings, SyncSourceTypesAndDodgyValues) {
-  FatalReports reports;
-  EXPECT_EQ(getDisplayString(ssFreeRunning), L"Free Running");
-  EXPECT_EQ(getDisplayString(ssVideo), L"Video");
-  EXPECT_EQ(getDisplayString(ssLTC), L"LTC");
-  EXPECT_EQ(getDisplayString(ssAES_EBU), L"AES/EBU");
-  EXPECT_TRUE(reports.take().empty());
-  for (int bad : {0, 5, -1, 1000}) {
-    EXPECT_EQ(getDisplayString(eIO_SyncSourceType(bad)), L"") << bad;
-    EXPECT_EQ(reports.take(), std::vector<std::string>{"Dodgy enum!"}) << bad;
-  }
-}
-
-TEST(IO_SyncSource, DisplayTexts) {
   const struct {
     eIO_SyncSourceType type;
     unsigned input;
@@ -168,62 +112,49 @@ TEST(IO_SyncSource, DisplayTexts) {
               {ssFreeRunning, 2, L"Free Running 3"},  {ssLTC, 0xFFFFFFFF, L"LTC 0"},
               {ssLTC, 0x7FFFFFFF, L"LTC 2147483648"}, {ssVideo, 0xFFFFFFFE, L"Video 4294967295"}};
   for (const auto& row : rows) EXPECT_EQ(IO_SyncSource(row.type, row.input).getDisplayString(), row.text);
-  FatalReports reports;
   EXPECT_EQ(IO_SyncSource().getDisplayString(), L" 0");
-  EXPECT_EQ(reports.take(), std::vector<std::string>{"Dodgy enum!"});
-}
+  EXPECT_EQ(reports.take(), Texts{"Dodgy enum!"});
 
-TEST(IO_SyncSource, ValueSemantics) {
-  IO_SyncSource source(ssVideo, 3);
-  IO_SyncSource copy(source);
+  IO_SyncSource source(ssVideo, 3), copy(source);
   EXPECT_EQ(copy, source);
   EXPECT_EQ(copy.inputNumber(7), sSuccess);
   EXPECT_EQ(copy.type(eIO_SyncSourceType(99)), sSuccess);  // any value is taken
   EXPECT_EQ(source.inputNumber(), 3u);                     // copies have their own record
-  EXPECT_FALSE(copy == source);
   source = copy;
   copy.reset();
-  EXPECT_EQ(source.type(), eIO_SyncSourceType(99));
-  EXPECT_EQ(source.inputNumber(), 7u);
+  EXPECT_TRUE(source.type() == eIO_SyncSourceType(99) && source.inputNumber() == 7u);
   EXPECT_EQ(copy, IO_SyncSource());
-  EXPECT_EQ(copy.type(), ssNone);
-  EXPECT_EQ(copy.inputNumber(), 0xFFFFFFFFu);
-  EXPECT_TRUE(copy.valid());
+  EXPECT_FALSE(copy == source);
 }
 
 TEST(AudCapsVector, LooksUpByType) {
-  const IO_ConnectionTypeInfo::Rep a = record(ccDigital, ct1394), b = record(ccAnalogue, ctAnalogue),
-                                   c = record(ccDigital, ct1394);
-  AudCapsVector<IO_ConnectionTypeInfo, eIO_ConnectionType> caps;
-  EXPECT_EQ(caps.find(ct1394), 0u);
-  EXPECT_EQ(caps[ct1394].type(), ctNone);
-  caps.push_back(IO_CapsFactory::makeConnectionTypeInfo(b));
-  caps.push_back(IO_CapsFactory::makeConnectionTypeInfo(a));
-  caps.push_back(IO_CapsFactory::makeConnectionTypeInfo(c));
-  EXPECT_EQ(caps.find(ct1394), 1u);
+  const auto a = record(ccDigital, ct1394), b = record(ccAnalogue, ctAnalogue), c = record(ccDigital, ct1394);
+  using Caps = AudCapsVector<IO_ConnectionTypeInfo, eIO_ConnectionType>;
+  Caps caps, assigned;
+  EXPECT_TRUE(caps.find(ct1394) == 0 && caps[ct1394].type() == ctNone);
+  for (const auto* rep : {&b, &a, &c}) caps.push_back(info(*rep));
+  EXPECT_EQ(caps.find(ct1394), 1u);  // the first of that type
   EXPECT_EQ(caps.find(ctAnalogue), 0u);
   EXPECT_EQ(caps.find(ctHDMI), caps.size());
   EXPECT_EQ(caps[ctHDMI].type(), ctNone);  // an invalid info
-  EXPECT_TRUE(caps[ct1394].isDigital());
-  EXPECT_TRUE(caps.at(0).isAnalogue());
-
-  const AudCapsVector<IO_ConnectionTypeInfo, eIO_ConnectionType> copy(caps);
-  EXPECT_EQ(copy.size(), 3u);
-  AudCapsVector<IO_ConnectionTypeInfo, eIO_ConnectionType> assigned;
-  assigned = copy;
+  EXPECT_TRUE(caps[ct1394].isDigital() && caps.at(0).isAnalogue());
+  assigned = caps;
   EXPECT_EQ(assigned.find(ct1394), 1u);
   const std::vector<IO_ConnectionTypeInfo, StdAllocator<IO_ConnectionTypeInfo>> plain(2, caps[ct1394]);
-  const AudCapsVector<IO_ConnectionTypeInfo, eIO_ConnectionType> fromVector(plain);
-  EXPECT_EQ(fromVector.find(ct1394), 0u);
+  EXPECT_EQ(Caps(plain).find(ct1394), 0u);
 
   const IO_SyncSourceTypeInfo::Rep video{1, ssVideo}, aes{2, ssAES_EBU};
   AudCapsVector<IO_SyncSourceTypeInfo, eIO_SyncSourceType> sync;
-  sync.push_back(IO_CapsFactory::makeSyncSourceTypeInfo(video));
-  sync.push_back(IO_CapsFactory::makeSyncSourceTypeInfo(aes));
+  for (const auto* rep : {&video, &aes}) sync.push_back(IO_CapsFactory::makeSyncSourceTypeInfo(*rep));
   EXPECT_EQ(sync.find(ssAES_EBU), 1u);
   EXPECT_EQ(sync[ssAES_EBU].numInputs(), 2u);
   EXPECT_EQ(sync.find(ssLTC), 2u);
-  EXPECT_EQ(sync[ssLTC].type(), ssNone);
+  FatalReports reports;
+  EXPECT_EQ(sync[ssLTC].type(), ssNone);  // an invalid info, whose type alone is not reported
+  EXPECT_EQ(IO_CapsFactory::makeSyncSourceTypeInfo(nullptr).type(), ssNone);
+  EXPECT_TRUE(reports.take().empty());
+  EXPECT_EQ(sync[ssLTC].numInputs(), 0u);
+  EXPECT_EQ(reports.take(), Texts{"Method called on invalid IO_SyncSourceTypeInfo object"});
 }
 
 }  // namespace
