@@ -1,9 +1,12 @@
 // Helpers shared by the level automation tests.
 #pragma once
 
-#include <atomic>
-#include <initializer_list>
+#include <algorithm>
+#include <cstdlib>
+#include <sstream>
+#include <stdexcept>
 #include <string>
+#include <tuple>
 #include <vector>
 
 #include "host/HostHooks.h"
@@ -14,64 +17,54 @@ namespace levels_test {
 
 using Aud::DynamicLevelControl::Store;
 using Node = Store::Node;
-inline constexpr Store::eNodeType N = Store::Normal;
-inline constexpr Store::eNodeType SG = Store::StartGuard;
-inline constexpr Store::eNodeType EG = Store::EndGuard;
-inline constexpr Store::eNodeType MD = Store::MarkedForDelete;
+inline constexpr Store::eNodeType N = Store::Normal, SG = Store::StartGuard, EG = Store::EndGuard,
+                                  MD = Store::MarkedForDelete;
 
-// Builds a store exactly as listed: no window erase, no guard adjustment.
-inline void fill(Store& s, std::initializer_list<Node> nodes) {
-  for (const Node& n : nodes) s.insert_noAdjust(n);
+// Nodes written as "S0:.3 1:.5 M2:.4 E3:.6*": raw time:level, prefixed S, E
+// or M for a start guard, end guard or marked node, suffixed * when black.
+inline std::vector<Node> parse(const std::string& text) {
+  std::vector<Node> out;
+  std::istringstream in(text);
+  for (std::string word; in >> word;) {
+    const std::size_t kind = std::string("NSEM").find(word[0]);
+    char* end = nullptr;
+    const double t = std::strtod(word.c_str() + (kind == std::string::npos ? 0 : 1), &end);
+    if (*end != ':') throw std::invalid_argument(word);
+    const float level = std::strtof(end + 1, &end);
+    if (*end != '\0' && std::string(end) != "*") throw std::invalid_argument(word);
+    out.emplace_back(t, level, static_cast<Store::eNodeType>(kind == std::string::npos ? 0 : kind),
+                     *end == '*');
+  }
+  return out;
 }
 
-inline std::vector<Node> nodesOf(Store& s) {
+// Builds a store exactly as written: no window erase, no guard adjustment.
+inline void fill(Store& s, const std::string& text) {
+  for (const Node& n : parse(text)) s.insert_noAdjust(n);
+}
+
+// Every field of every node, for exact comparison.
+using Fields = std::vector<std::tuple<double, float, int, bool>>;
+inline Fields fields(const std::vector<Node>& nodes) {
+  Fields out;
+  for (const Node& n : nodes) out.emplace_back(n.time, n.level, n.type, n.inAudioBlack);
+  return out;
+}
+inline Fields fields(const std::string& text) { return fields(parse(text)); }
+inline Fields fields(Store& s) {
   const criticalSection lock = s.getLockObject();
   CriticalSectionLock hold(lock);
-  std::vector<Node> out;
-  for (Store::iterator it = s.begin(); it != s.end(); ++it) out.push_back(it.getNode());
-  return out;
+  std::vector<Node> nodes;
+  for (Store::iterator it = s.begin(); it != s.end(); ++it) nodes.push_back(it.getNode());
+  return fields(nodes);
 }
-
-inline std::vector<float> levelsOf(Store& s) {
-  std::vector<float> out;
-  for (const Node& n : nodesOf(s)) out.push_back(n.level);
-  return out;
+inline bool ordered(Store& s) {
+  const Fields f = fields(s);
+  return std::is_sorted(f.begin(), f.end(), [](auto& a, auto& b) { return std::get<0>(a) < std::get<0>(b); });
 }
-
-inline std::vector<double> timesOf(Store& s) {
-  std::vector<double> out;
-  for (const Node& n : nodesOf(s)) out.push_back(n.time);
-  return out;
-}
-
-inline bool orderedByRawTime(Store& s) {
-  const std::vector<double> t = timesOf(s);
-  for (std::size_t i = 1; i < t.size(); ++i)
-    if (t[i] < t[i - 1]) return false;
-  return true;
-}
-
-// Counts vel_splat reports while alive.
-class FatalReports {
- public:
-  FatalReports() {
-    host::setFatalReportHandler([this](const char* m) {
-      ++count_;
-      last_ = m;
-    });
-  }
-  ~FatalReports() { host::setFatalReportHandler({}); }
-  int count() const { return count_; }
-  const std::string& last() const { return last_; }
-
- private:
-  std::atomic<int> count_{0};
-  std::string last_;
-};
 
 // Sets the project frame duration for a scope.
-class FrameDuration {
- public:
+struct FrameDuration {
   explicit FrameDuration(double seconds) { host::setFrameDuration(seconds); }
   ~FrameDuration() { host::setFrameDuration(1.0 / 25.0); }
 };
