@@ -8,7 +8,8 @@
 //   reference's compare chain does (type 0).
 // - The integer forms zero a NaN first, then clamp; the clamped, scaled value
 //   is always in range, so cvttps2dq never yields its 0x80000000 overflow
-//   marker, and the reference's 24-bit limit is already met.
+//   marker, and the reference's 24-bit limit is already met. Type 2 lets the
+//   NaN through instead: 0x80000000 has the silent low three bytes it keeps.
 // - Type 4 adds 1.0 in float: a double sum of two floats rounded to float is
 //   the float sum (double has more than 2 * 24 + 2 bits).
 #if defined(__x86_64__) || defined(__i386__)
@@ -153,20 +154,27 @@ TONEBITS_AVX2 void floatToInt16(const float* src, unsigned char* dst, std::size_
   fromFloatLoop<SampleRules::floatToInt16, 2>(src + i, dst + 2 * i, count - i);
 }
 
-TONEBITS_AVX2 void floatToInt24(const float* src, unsigned char* dst, std::size_t count) noexcept {
+TONEBITS_AVX2 inline __m256i int24Bytes(const float* p) noexcept {
   // Each lane packs its four samples into its low 12 bytes; the permute
   // joins the two lanes into 24 contiguous bytes.
   const __m256i pack = _mm256_setr_epi8(                       //
       0, 1, 2, 4, 5, 6, 8, 9, 10, 12, 13, 14, -1, -1, -1, -1,  //
       0, 1, 2, 4, 5, 6, 8, 9, 10, 12, 13, 14, -1, -1, -1, -1);
-  const __m256i join = _mm256_setr_epi32(0, 1, 2, 4, 5, 6, 3, 7);
+  const __m256i words = _mm256_cvttps_epi32(
+      _mm256_mul_ps(clampKeepNaN(load8(p), -1.0f, kFloatMax), _mm256_set1_ps(8388608.0f)));
+  return _mm256_permutevar8x32_epi32(_mm256_shuffle_epi8(words, pack),
+                                     _mm256_setr_epi32(0, 1, 2, 4, 5, 6, 3, 7));
+}
+
+TONEBITS_AVX2 void floatToInt24(const float* src, unsigned char* dst, std::size_t count) noexcept {
   std::size_t i = 0;
+  // One 32-byte store per eight samples: its last 8 bytes are overwritten by
+  // the next store, so it runs while 32 bytes of destination remain.
+  for (; i + 11 <= count; i += 8) store32B(dst + 3 * i, int24Bytes(src + i));
   for (; i + 8 <= count; i += 8) {
-    const __m256i words = toInt(src + i, -1.0f, kFloatMax, 8388608.0f);
-    const __m256i bytes = _mm256_permutevar8x32_epi32(_mm256_shuffle_epi8(words, pack), join);
-    unsigned char* p = dst + 3 * i;
-    store16B(p, _mm256_castsi256_si128(bytes));
-    _mm_storel_epi64(reinterpret_cast<__m128i*>(p + 16), _mm256_extracti128_si256(bytes, 1));
+    const __m256i bytes = int24Bytes(src + i);
+    store16B(dst + 3 * i, _mm256_castsi256_si128(bytes));
+    _mm_storel_epi64(reinterpret_cast<__m128i*>(dst + 3 * i + 16), _mm256_extracti128_si256(bytes, 1));
   }
   fromFloatLoop<SampleRules::floatToInt24, 3>(src + i, dst + 3 * i, count - i);
 }
@@ -215,17 +223,21 @@ TONEBITS_AVX2 void floatToInt24in32(const float* src, unsigned char* dst, std::s
   fromFloatLoop<SampleRules::floatToInt24in32, 4>(src + i, dst + 4 * i, count - i);
 }
 
-TONEBITS_AVX2 inline __m128i int32OfHalf(__m128 v) noexcept {
-  const __m256d d = _mm256_mul_pd(_mm256_cvtps_pd(v), _mm256_set1_pd(2147483647.5));
-  return _mm256_cvttpd_epi32(_mm256_sub_pd(d, _mm256_set1_pd(0.5)));
-}
-
+// See kInt32Scale.
 TONEBITS_AVX2 void floatToInt32(const float* src, unsigned char* dst, std::size_t count) noexcept {
+  const __m256 sign = _mm256_set1_ps(-0.0f), scale = _mm256_set1_ps(kInt32Scale), one = _mm256_set1_ps(1.0f);
   std::size_t i = 0;
   for (; i + 8 <= count; i += 8) {
-    const __m256 v = clampNaNToZero(load8(src + i), -1.0f, 1.0f);
-    const __m128i a = int32OfHalf(_mm256_castps256_ps128(v)), b = int32OfHalf(_mm256_extractf128_ps(v, 1));
-    store32B(dst + 4 * i, _mm256_set_m128i(b, a));
+    const __m256 c = load8(src + i);
+    // |F|, clamped; maxps returns its second operand, 0, for a NaN.
+    const __m256 f = _mm256_min_ps(
+        _mm256_max_ps(_mm256_mul_ps(_mm256_andnot_ps(sign, c), scale), _mm256_setzero_ps()), scale);
+    const __m256 whole = _mm256_round_ps(f, _MM_FROUND_TO_ZERO | _MM_FROUND_NO_EXC);
+    const __m256 up =
+        _mm256_and_ps(_mm256_cmp_ps(_mm256_sub_ps(f, whole), _mm256_set1_ps(0.5f), _CMP_GT_OQ), one);
+    const __m256 q = _mm256_or_ps(_mm256_add_ps(whole, up), _mm256_and_ps(c, sign));  // +-Q
+    const __m256i less = _mm256_castps_si256(_mm256_cmp_ps(q, one, _CMP_GE_OQ));      // -1 where Q - 1 is due
+    store32B(dst + 4 * i, _mm256_add_epi32(_mm256_cvttps_epi32(q), less));
   }
   fromFloatLoop<SampleRules::floatToInt32, 4>(src + i, dst + 4 * i, count - i);
 }

@@ -153,7 +153,10 @@ TONEBITS_SSE2 void floatToInt24(const float* src, unsigned char* dst, std::size_
   const __m128i second = _mm_set1_epi64x(0x0000FFFFFF000000LL);
   std::size_t i = 0;
   for (; i + 4 <= count; i += 4) {
-    const __m128i words = toInt(src + i, -1.0f, kFloatMax, 8388608.0f);
+    // A NaN passes the clamp and converts to 0x80000000, whose low three
+    // bytes are the silence it must give.
+    const __m128 v = clampKeepNaN(_mm_loadu_ps(src + i), -1.0f, kFloatMax);
+    const __m128i words = _mm_cvttps_epi32(_mm_mul_ps(v, _mm_set1_ps(8388608.0f)));
     const __m128i pairs =
         _mm_or_si128(_mm_and_si128(words, first), _mm_and_si128(_mm_srli_epi64(words, 8), second));
     const __m128i bytes = _mm_or_si128(_mm_move_epi64(pairs), _mm_slli_si128(_mm_srli_si128(pairs, 8), 6));
@@ -198,6 +201,8 @@ TONEBITS_SSE2 void floatToInt24in32(const float* src, unsigned char* dst, std::s
   fromFloatLoop<SampleRules::floatToInt24in32, 4>(src + i, dst + 4 * i, count - i);
 }
 
+// The reference's own double arithmetic: without a rounding instruction the
+// float method of the AVX2 kernel (see kInt32Scale) costs more than this.
 TONEBITS_SSE2 inline __m128i int32OfPair(__m128 v) noexcept {
   const __m128d d = _mm_mul_pd(_mm_cvtps_pd(v), _mm_set1_pd(2147483647.5));
   return _mm_cvttpd_epi32(_mm_sub_pd(d, _mm_set1_pd(0.5)));
