@@ -99,6 +99,7 @@ void BM_Conversion(benchmark::State& state) {
     if (t1 > t0) ratios.push_back((t2 - t1) / (t1 - t0));
   }
   std::nth_element(ratios.begin(), ratios.begin() + ratios.size() / 2, ratios.end());
+  state.counters["memcpy_us"] = copyTotal / double(state.iterations()) * 1e6;
   state.counters["ratio"] = convTotal / copyTotal;
   state.counters["ratio_median"] = ratios.empty() ? 0.0 : ratios[ratios.size() / 2];
   state.SetBytesProcessed(static_cast<int64_t>(state.iterations() * copyBytes));

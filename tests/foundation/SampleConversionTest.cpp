@@ -335,10 +335,14 @@ TEST(SampleConversion, WideIntegerFormsAtTheirBoundsAndAtRandom) {
 }
 
 // Compares a block conversion with the per-sample rule at every length up to
-// 67, at byte offsets 0..3 on the stored side and float offsets 0..3 on the
-// float side, with guard bytes around the destination.
+// 67 and a few around the widest unrolled step (4 x 32 samples), at byte
+// offsets 0..3 on the stored side and float offsets 0..3 on the float side,
+// with guard bytes around the destination.
 TEST(SampleConversion, BlocksMatchTheRulesAtEveryLengthAndOffset) {
-  constexpr std::size_t kMax = 67, kGuard = 16;
+  constexpr std::size_t kMax = 263, kGuard = 16;
+  std::vector<std::size_t> lengths;
+  for (std::size_t len = 0; len <= 67; ++len) lengths.push_back(len);
+  lengths.insert(lengths.end(), {127, 128, 129, 130, 131, 134, 161, 255, 256, 259, 263});
   constexpr unsigned char kFill = 0xA5;
   const std::vector<float> floats = randomFloats(kMax + 4, 11);
   EachLevel each;
@@ -347,7 +351,7 @@ TEST(SampleConversion, BlocksMatchTheRulesAtEveryLengthAndOffset) {
     const Bytes stored = randomSamples(type, kMax + 4, 12 + type);
     for (eLevel level : each.levels) {
       Aud::Simd::setActiveLevel(level);
-      for (std::size_t len = 0; len <= kMax; ++len) {
+      for (std::size_t len : lengths) {
         for (std::size_t off = 0; off < 4; ++off) {
           SCOPED_TRACE(testing::Message() << "type " << type << " " << Aud::Simd::levelName(level) << " len "
                                           << len << " offset " << off);

@@ -38,6 +38,29 @@ inline void fromFloatLoop(const float* src, unsigned char* dst, std::size_t coun
   for (std::size_t i = 0; i < count; ++i) Rule(src[i], dst + i * Bytes);
 }
 
+// The shape of a vector kernel K, which each instruction-set file runs with
+// its own driver: K::load reads one group of K::kStep samples, K::store
+// converts and writes it, K::storeWide may also write up to K::kSlack samples'
+// worth of bytes past the group (the next group rewrites them), and K::tail
+// takes the samples after the last group. Strides are in elements of In and
+// Out.
+template <unsigned Bytes, float (*Rule)(const unsigned char*) noexcept>
+struct ToFloatKernelBase {
+  using In = unsigned char;
+  using Out = float;
+  static constexpr std::size_t kInStride = Bytes, kOutStride = 1, kSlack = 0;
+  static void tail(const In* src, Out* dst, std::size_t n) noexcept { toFloatLoop<Rule, Bytes>(src, dst, n); }
+};
+template <unsigned Bytes, void (*Rule)(float, unsigned char*) noexcept>
+struct FromFloatKernelBase {
+  using In = float;
+  using Out = unsigned char;
+  static constexpr std::size_t kInStride = 1, kOutStride = Bytes, kSlack = 0;
+  static void tail(const In* src, Out* dst, std::size_t n) noexcept {
+    fromFloatLoop<Rule, Bytes>(src, dst, n);
+  }
+};
+
 // Types 0 and 7 read as a plain copy, and so does type 7 written.
 inline void copyFloats(const unsigned char* src, float* dst, std::size_t count) noexcept {
   std::memcpy(dst, src, count * 4);
