@@ -17,7 +17,7 @@
 
 #include <immintrin.h>
 
-#include "tonebits/foundation/Aud__SampleConversionKernels.h"
+#include "tonebits/foundation/Aud__SampleConversion_internal.h"
 
 #define TONEBITS_AVX2 __attribute__((target("avx2")))
 

@@ -8,7 +8,7 @@
 
 #include <emmintrin.h>
 
-#include "tonebits/foundation/Aud__SampleConversionKernels.h"
+#include "tonebits/foundation/Aud__SampleConversion_internal.h"
 
 #define TONEBITS_SSE2 __attribute__((target("sse2")))
 
