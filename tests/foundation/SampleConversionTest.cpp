@@ -35,6 +35,7 @@ Bytes le(uint64_t v, unsigned n) {
   return b;
 }
 
+constexpr std::size_t kRun = 37;  // longer than any vector loop step, not a multiple of one
 const float kNaN = std::numeric_limits<float>::quiet_NaN();
 const float kInf = std::numeric_limits<float>::infinity();
 const float kDenorm = std::numeric_limits<float>::denorm_min();
@@ -74,7 +75,10 @@ std::vector<float> specialFloats() {
                           std::numeric_limits<float>::max(),
                           2.0f,
                           -2.0f};
-  for (float bound : {-1.0f, 1.0f, kFloatMax, kInt16Max, kInt8Max, 0.0f, 2.0f}) {
+  // Type 6's rounding edges: c * 2^31 near small half-integers, and where
+  // it stops having a fraction.
+  for (float edge : {0x1p-32f, 0x1p-31f, 0x1.8p-31f, 0x1.4p-30f, 0x1p-8f}) v.insert(v.end(), {edge, -edge});
+  for (float bound : {-1.0f, 1.0f, kFloatMax, kInt16Max, kInt8Max, 0.0f, 2.0f, 0x1p-8f}) {
     v.push_back(bound);
     v.push_back(std::nextafter(bound, 3.0f));
     v.push_back(std::nextafter(bound, -3.0f));
@@ -121,85 +125,54 @@ TEST(SampleConversion, WritingFollowsTheClampAndTruncateRules) {
     float in;
     uint64_t out;
   };
+  // clang-format off
   const Row rows[] = {
-      {0, 1.0f, 0x3F7FFFFE},
-      {0, kInf, 0x3F7FFFFE},
-      {0, -2.0f, 0xBF800000},
-      {0, -1.0f, 0xBF800000},
-      {0, 0.5f, 0x3F000000},
-      {0, -0.0f, 0x80000000},
-      {0, kDenorm, 0x00000001},
-      {0, kFloatMax, 0x3F7FFFFE},
-      {1, -1.0f, 0x8000},
-      {1, 1.0f, 0x7FFF},
-      {1, kInt16Max, 0x7FFF},
-      {1, std::nextafter(kInt16Max, 0.0f), 0x7FFE},
-      {1, -kInf, 0x8000},
-      {1, -0x1p-16f, 0x0000},
-      {1, 0.5f, 0x4000},
-      {1, -0x1p-15f, 0xFFFF},
-      {2, -1.0f, 0x800000},
-      {2, 1.0f, 0x7FFFFF},
-      {2, kFloatMax, 0x7FFFFF},
-      {2, -0x1p-23f, 0xFFFFFF},
-      {2, 0.5f, 0x400000},
-      {2, 1e30f, 0x7FFFFF},
-      {3, -1.0f, 0x80},
-      {3, 1.0f, 0x7F},
-      {3, kInt8Max, 0x7F},
-      {3, -0x1p-7f, 0xFF},
-      {3, 0.5f, 0x40},
+      {0, 1.0f, 0x3F7FFFFE}, {0, kInf, 0x3F7FFFFE}, {0, -2.0f, 0xBF800000}, {0, -1.0f, 0xBF800000},
+      {0, 0.5f, 0x3F000000}, {0, -0.0f, 0x80000000}, {0, kDenorm, 0x00000001}, {0, kFloatMax, 0x3F7FFFFE},
+      {1, -1.0f, 0x8000}, {1, 1.0f, 0x7FFF}, {1, kInt16Max, 0x7FFF}, {1, -kInf, 0x8000},
+      {1, -0x1p-16f, 0x0000}, {1, 0.5f, 0x4000}, {1, -0x1p-15f, 0xFFFF},
+      {2, -1.0f, 0x800000}, {2, 1.0f, 0x7FFFFF}, {2, kFloatMax, 0x7FFFFF}, {2, -0x1p-23f, 0xFFFFFF},
+      {2, 0.5f, 0x400000}, {2, 1e30f, 0x7FFFFF},
+      {3, -1.0f, 0x80}, {3, 1.0f, 0x7F}, {3, kInt8Max, 0x7F}, {3, -0x1p-7f, 0xFF}, {3, 0.5f, 0x40},
       {3, -kInf, 0x80},
-      {4, 1.0f, 0xFF},
-      {4, -1.0f, 0x00},
-      {4, 0.0f, 0x7F},
-      {4, -0.0f, 0x7F},
-      {4, 0.5f, 0xBF},
-      {4, kInf, 0xFF},
-      {4, -kInf, 0x00},
-      {4, kDenorm, 0x7F},
-      {5, -1.0f, 0xFF800000},
-      {5, 1.0f, 0x007FFFFF},
-      {5, -0x1p-23f, 0xFFFFFFFF},
-      {5, 0.5f, 0x00400000},
-      {6, 1.0f, 0x7FFFFFFF},
-      {6, -1.0f, 0x80000000},
-      {6, 0.0f, 0},
-      {6, 2.0f, 0x7FFFFFFF},
-      {6, 0.5f, 0x3FFFFFFF},
-      {6, -kInf, 0x80000000},
-      {6, -0.0f, 0},
-      {7, 1.5f, 0x3FC00000},
-      {7, -kInf, 0xFF800000},
-      {7, -0.0f, 0x80000000},
-      {8, 1.0f, 0x3FF0000000000000},
-      {8, -0.0f, 0x8000000000000000},
-      {8, kInf, 0x7FF0000000000000},
+      {4, 1.0f, 0xFF}, {4, -1.0f, 0x00}, {4, 0.0f, 0x7F}, {4, -0.0f, 0x7F}, {4, 0.5f, 0xBF},
+      {4, kInf, 0xFF}, {4, -kInf, 0x00}, {4, kDenorm, 0x7F},
+      {5, -1.0f, 0xFF800000}, {5, 1.0f, 0x007FFFFF}, {5, -0x1p-23f, 0xFFFFFFFF}, {5, 0.5f, 0x00400000},
+      {6, 1.0f, 0x7FFFFFFF}, {6, -1.0f, 0x80000000}, {6, 0.0f, 0}, {6, 2.0f, 0x7FFFFFFF},
+      {6, 0.5f, 0x3FFFFFFF}, {6, -kInf, 0x80000000}, {6, -0.0f, 0},
+      {7, 1.5f, 0x3FC00000}, {7, -kInf, 0xFF800000}, {7, -0.0f, 0x80000000},
+      {8, 1.0f, 0x3FF0000000000000}, {8, -0.0f, 0x8000000000000000}, {8, kInf, 0x7FF0000000000000},
       {8, kDenorm, 0x36A0000000000000},
-      // Just beyond each bound.
-      {0, std::nextafter(kFloatMax, 2.0f), 0x3F7FFFFE},
-      {0, std::nextafter(-1.0f, -2.0f), 0xBF800000},
-      {1, std::nextafter(kInt16Max, 2.0f), 0x7FFF},
-      {1, std::nextafter(-1.0f, -2.0f), 0x8000},
-      {2, std::nextafter(kFloatMax, 2.0f), 0x7FFFFF},
-      {2, std::nextafter(kFloatMax, 0.0f), 0x7FFFFE},
-      {3, std::nextafter(kInt8Max, 2.0f), 0x7F},
-      {3, std::nextafter(-1.0f, -2.0f), 0x80},
-      {4, std::nextafter(1.0f, 2.0f), 0xFF},
-      {4, std::nextafter(-1.0f, -2.0f), 0x00},
-      {6, std::nextafter(1.0f, 2.0f), 0x7FFFFFFF},
+      // Just beyond each bound, and just inside.
+      {0, std::nextafter(kFloatMax, 2.0f), 0x3F7FFFFE}, {0, std::nextafter(-1.0f, -2.0f), 0xBF800000},
+      {1, std::nextafter(kInt16Max, 2.0f), 0x7FFF}, {1, std::nextafter(-1.0f, -2.0f), 0x8000},
+      {1, std::nextafter(kInt16Max, 0.0f), 0x7FFE}, {2, std::nextafter(kFloatMax, 2.0f), 0x7FFFFF},
+      {2, std::nextafter(kFloatMax, 0.0f), 0x7FFFFE}, {3, std::nextafter(kInt8Max, 2.0f), 0x7F},
+      {3, std::nextafter(-1.0f, -2.0f), 0x80}, {4, std::nextafter(1.0f, 2.0f), 0xFF},
+      {4, std::nextafter(-1.0f, -2.0f), 0x00}, {6, std::nextafter(1.0f, 2.0f), 0x7FFFFFFF},
       {6, std::nextafter(-1.0f, -2.0f), 0x80000000},
+      // Type 6 where c * 2^31 is a small multiple of 1/4 (the rounding edges
+      // of c * 2147483647.5 - 0.5), and where it stops having a fraction.
+      {6, 0x1p-32f, 0}, {6, 0x1p-31f, 0}, {6, 0x1.8p-31f, 0}, {6, 0x1.cp-31f, 1}, {6, 0x1p-30f, 1},
+      {6, 0x1.4p-30f, 1}, {6, -0x1p-32f, 0}, {6, -0x1p-31f, 0xFFFFFFFF}, {6, -0x1.8p-31f, 0xFFFFFFFF},
+      {6, -0x1.cp-31f, 0xFFFFFFFE}, {6, -0x1.4p-30f, 0xFFFFFFFE}, {6, 0x1p-8f, 0x007FFFFF},
+      {6, -0x1p-8f, 0xFF800000},
   };
+  // clang-format on
   EachLevel each;
   for (const Row& row : rows) {
     SCOPED_TRACE(testing::Message() << "type " << row.type << " in " << row.in);
     const Bytes expected = le(row.out, bytesPerSampleOfType(row.type));
     EXPECT_EQ(fromFloatRule(row.type, row.in), expected);
+    // A run of the value covers whole vectors and the scalar tail.
+    const std::vector<float> run(kRun, row.in);
+    Bytes want;
+    for (std::size_t i = 0; i < kRun; ++i) want.insert(want.end(), expected.begin(), expected.end());
     for (eLevel level : each.levels) {
       Aud::Simd::setActiveLevel(level);
-      Bytes got(expected.size());
-      ASSERT_TRUE(Aud::convertFromFloat(row.type, &row.in, got.data(), 1));
-      EXPECT_EQ(got, expected) << Aud::Simd::levelName(level);
+      Bytes got(want.size());
+      ASSERT_TRUE(Aud::convertFromFloat(row.type, run.data(), got.data(), kRun));
+      EXPECT_EQ(got, want) << Aud::Simd::levelName(level);
     }
   }
 }
@@ -210,42 +183,29 @@ TEST(SampleConversion, ReadingScalesEachStoredForm) {
     uint64_t in;
     float out;
   };
+  // clang-format off
   const Row rows[] = {
-      {0, 0x3FC00000, 1.5f},
-      {7, 0x7F800000, kInf},
-      {1, 0x8000, -1.0f},
-      {1, 0x7FFF, kInt16Max},
-      {1, 0x0001, 0x1p-15f},
-      {2, 0x800000, -1.0f},
-      {2, 0x7FFFFF, kFloatMax},
-      {2, 0xFFFFFF, -0x1p-23f},
-      {3, 0x80, -1.0f},
-      {3, 0x7F, kInt8Max},
-      {4, 0x00, -1.0f},
-      {4, 0xFF, kInt8Max},
-      {4, 0x80, 0.0f},
-      {4, 0x7F, -0x1p-7f},
-      {5, 0xAB800000, -1.0f},
-      {5, 0x127FFFFF, kFloatMax},
-      {5, 0xFF000001, 0x1p-23f},
-      {6, 0x7FFFFFFF, 1.0f},
-      {6, 0x80000000, -1.0f},
-      {6, 0x00000000, 0x1p-32f},
-      {6, 0xFFFFFFFF, -0x1p-32f},
-      {8, 0x3FF0000010000000, 1.0f},
-      {8, 0x3FF0000010000001, 1.0f + 0x1p-23f},
+      {0, 0x3FC00000, 1.5f}, {7, 0x7F800000, kInf}, {1, 0x8000, -1.0f}, {1, 0x7FFF, kInt16Max},
+      {1, 0x0001, 0x1p-15f}, {2, 0x800000, -1.0f}, {2, 0x7FFFFF, kFloatMax}, {2, 0xFFFFFF, -0x1p-23f},
+      {3, 0x80, -1.0f}, {3, 0x7F, kInt8Max}, {4, 0x00, -1.0f}, {4, 0xFF, kInt8Max}, {4, 0x80, 0.0f},
+      {4, 0x7F, -0x1p-7f}, {5, 0xAB800000, -1.0f}, {5, 0x127FFFFF, kFloatMax}, {5, 0xFF000001, 0x1p-23f},
+      {6, 0x7FFFFFFF, 1.0f}, {6, 0x80000000, -1.0f}, {6, 0x00000000, 0x1p-32f}, {6, 0xFFFFFFFF, -0x1p-32f},
+      {8, 0x3FF0000010000000, 1.0f}, {8, 0x3FF0000010000001, 1.0f + 0x1p-23f},
       {8, 0x7E37E43C8800759C, kInf},  // 1e300
   };
+  // clang-format on
   EachLevel each;
   for (const Row& row : rows) {
     SCOPED_TRACE(testing::Message() << "type " << row.type << " in 0x" << std::hex << row.in);
     const Bytes in = le(row.in, bytesPerSampleOfType(row.type));
     EXPECT_EQ(bitsOf(Aud::sampleToFloat(row.type, in.data())), bitsOf(row.out));
+    Bytes run;
+    for (std::size_t i = 0; i < kRun; ++i) run.insert(run.end(), in.begin(), in.end());
     for (eLevel level : each.levels) {
       Aud::Simd::setActiveLevel(level);
-      float got = 0.0f;
-      ASSERT_TRUE(Aud::convertToFloat(row.type, in.data(), &got, 1));
-      EXPECT_EQ(bitsOf(got), bitsOf(row.out)) << Aud::Simd::levelName(level);
+      std::vector<float> got(kRun);
+      ASSERT_TRUE(Aud::convertToFloat(row.type, run.data(), got.data(), kRun));
+      for (float f : got) ASSERT_EQ(bitsOf(f), bitsOf(row.out)) << Aud::Simd::levelName(level);
     }
   }
 }
@@ -375,10 +335,14 @@ TEST(SampleConversion, WideIntegerFormsAtTheirBoundsAndAtRandom) {
 }
 
 // Compares a block conversion with the per-sample rule at every length up to
-// 67, at byte offsets 0..3 on the stored side and float offsets 0..3 on the
-// float side, with guard bytes around the destination.
+// 67 and a few around the widest unrolled step (4 x 32 samples), at byte
+// offsets 0..3 on the stored side and float offsets 0..3 on the float side,
+// with guard bytes around the destination.
 TEST(SampleConversion, BlocksMatchTheRulesAtEveryLengthAndOffset) {
-  constexpr std::size_t kMax = 67, kGuard = 16;
+  constexpr std::size_t kMax = 263, kGuard = 16;
+  std::vector<std::size_t> lengths;
+  for (std::size_t len = 0; len <= 67; ++len) lengths.push_back(len);
+  lengths.insert(lengths.end(), {127, 128, 129, 130, 131, 134, 161, 255, 256, 259, 263});
   constexpr unsigned char kFill = 0xA5;
   const std::vector<float> floats = randomFloats(kMax + 4, 11);
   EachLevel each;
@@ -387,7 +351,7 @@ TEST(SampleConversion, BlocksMatchTheRulesAtEveryLengthAndOffset) {
     const Bytes stored = randomSamples(type, kMax + 4, 12 + type);
     for (eLevel level : each.levels) {
       Aud::Simd::setActiveLevel(level);
-      for (std::size_t len = 0; len <= kMax; ++len) {
+      for (std::size_t len : lengths) {
         for (std::size_t off = 0; off < 4; ++off) {
           SCOPED_TRACE(testing::Message() << "type " << type << " " << Aud::Simd::levelName(level) << " len "
                                           << len << " offset " << off);

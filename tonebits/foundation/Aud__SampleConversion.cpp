@@ -1,6 +1,6 @@
 #include "tonebits/foundation/Aud__SampleConversion.h"
 
-#include "tonebits/foundation/Aud__SampleConversionKernels.h"
+#include "tonebits/foundation/Aud__SampleConversion_internal.h"
 #include "tonebits/foundation/Aud__Simd.h"
 
 namespace Aud {

@@ -38,6 +38,29 @@ inline void fromFloatLoop(const float* src, unsigned char* dst, std::size_t coun
   for (std::size_t i = 0; i < count; ++i) Rule(src[i], dst + i * Bytes);
 }
 
+// The shape of a vector kernel K, which each instruction-set file runs with
+// its own driver: K::load reads one group of K::kStep samples, K::store
+// converts and writes it, K::storeWide may also write up to K::kSlack samples'
+// worth of bytes past the group (the next group rewrites them), and K::tail
+// takes the samples after the last group. Strides are in elements of In and
+// Out.
+template <unsigned Bytes, float (*Rule)(const unsigned char*) noexcept>
+struct ToFloatKernelBase {
+  using In = unsigned char;
+  using Out = float;
+  static constexpr std::size_t kInStride = Bytes, kOutStride = 1, kSlack = 0;
+  static void tail(const In* src, Out* dst, std::size_t n) noexcept { toFloatLoop<Rule, Bytes>(src, dst, n); }
+};
+template <unsigned Bytes, void (*Rule)(float, unsigned char*) noexcept>
+struct FromFloatKernelBase {
+  using In = float;
+  using Out = unsigned char;
+  static constexpr std::size_t kInStride = 1, kOutStride = Bytes, kSlack = 0;
+  static void tail(const In* src, Out* dst, std::size_t n) noexcept {
+    fromFloatLoop<Rule, Bytes>(src, dst, n);
+  }
+};
+
 // Types 0 and 7 read as a plain copy, and so does type 7 written.
 inline void copyFloats(const unsigned char* src, float* dst, std::size_t count) noexcept {
   std::memcpy(dst, src, count * 4);
@@ -55,5 +78,16 @@ inline void copyFloats(const float* src, unsigned char* dst, std::size_t count) 
 // closest cases, 72 samples of the form +-(2147483583 - 128k), give the same
 // double too), so the division, four times slower, is not needed.
 inline constexpr double kInt32Reciprocal = 0x1.00000001p-31;
+
+// Type 6 written on the AVX2 path, in float. With F = c * 2^31 for the
+// clamped sample c (exact in float), the reference truncates the double
+// rounding of F - 0.5 - F * 2^-32. Both roundings are monotonic and every
+// half-integer near F is on the double grid, so the tiny last term only
+// decides on which side of an integer the result falls. With Q = |F| rounded
+// half down (ceil(|F| - 0.5)), the sample is -Q for c < 0 and max(Q - 1, 0)
+// otherwise. For c = 1, Q = 2^31 converts to 0x80000000 and the - 1 wraps it
+// to 0x7FFFFFFF. Checked against the reference for all 2^32 inputs; it saves
+// the double conversions, which cost twice the rest of the loop.
+inline constexpr float kInt32Scale = 0x1p31f;
 
 }  // namespace Aud::detail
