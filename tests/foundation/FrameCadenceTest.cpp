@@ -11,69 +11,35 @@
 namespace {
 
 using namespace Aud;
-using Aud::Util::getSMPTE_FieldSequence;
-using Aud::Util::getSMPTE_FrameSequence;
 using Counts = std::vector<unsigned>;
 
-Counts frames(SampleRate rate, int frameRate) {
-  const auto s = getSMPTE_FrameSequence(rate, Kv::FrameRate(frameRate));
-  return Counts(s.begin(), s.end());
-}
-
-Counts fields(SampleRate rate, int frameRate) {
-  const auto s = getSMPTE_FieldSequence(rate, Kv::FrameRate(frameRate));
-  return Counts(s.begin(), s.end());
-}
-
+Counts counts(const Util::SampleCounts& s) { return Counts(s.begin(), s.end()); }
+Counts frames(SampleRate r, int f) { return counts(Util::getSMPTE_FrameSequence(r, Kv::FrameRate(f))); }
+Counts fields(SampleRate r, int f) { return counts(Util::getSMPTE_FieldSequence(r, Kv::FrameRate(f))); }
 unsigned long long sum(const Counts& c) { return std::accumulate(c.begin(), c.end(), 0ull); }
 
-// Collects vel_splat reports while it lives.
-class FatalReports {
- public:
-  FatalReports() {
-    host::setFatalReportHandler([this](const char* m) { messages_.push_back(m); });
-  }
-  ~FatalReports() { host::setFatalReportHandler(nullptr); }
-  const std::vector<std::string>& messages() const { return messages_; }
+const SampleRate k48(sr48000, fNone), k44(sr44100, fNone), k32(sr32000, fNone), k22(sr22050, fNone),
+    k11(sr11025, fNone), k96(sr96000, fNone);
 
- private:
-  std::vector<std::string> messages_;
-};
-
-const SampleRate k48(sr48000, fNone), k44(sr44100, fNone), k32(sr32000, fNone);
-
-TEST(FrameCadence, OneEntryCadences) {
+TEST(FrameCadence, ShortCadences) {
   const struct {
     SampleRate rate;
     int frameRate;
     Counts expected;
-  } rows[] = {
-      {k48, 1, {2000}},
-      {k44, 1, {1837}},
-      {k32, 1, {1333}},
-      {k48, 2, {2002}},
-      {k44, 2, {}},
-      {k32, 2, {}},
-      {k48, 3, {1920}},
-      {k44, 3, {1764}},
-      {k32, 3, {1280}},
-      {k48, 4, {1600}},
-      {k44, 4, {1470}},
-      {k48, 7, {1001}},
-      {k44, 7, {}},
-      {k48, 8, {960}},
-      {k44, 8, {882}},
-      {k48, 9, {800}},
-      {k32, 9, {533}},
-      {k48, 10, {800, 801, 801, 801, 801}},
-      {k44, 10, {}},
-      {k32, 10, {}},
-      {SampleRate(sr48000, fx1_1001), 5, {1600}}  // the one exact pulled-down NTSC case
-  };
-  for (const auto& row : rows) {
-    SCOPED_TRACE(testing::Message() << row.rate.calcBaseSampleRate() << " Hz, frame rate " << row.frameRate);
-    EXPECT_EQ(frames(row.rate, row.frameRate), row.expected);
-  }
+  } rows[] = {{k48, 1, {2000}}, {k44, 1, {1837}}, {k32, 1, {1333}}, {k48, 2, {2002}}, {k44, 2, {}},
+              {k32, 2, {}},     {k48, 3, {1920}}, {k44, 3, {1764}}, {k32, 3, {1280}}, {k48, 4, {1600}},
+              {k44, 4, {1470}}, {k48, 7, {1001}}, {k44, 7, {}},     {k48, 8, {960}},  {k44, 8, {882}},
+              {k48, 9, {800}},  {k32, 9, {533}},  {k44, 10, {}},    {k32, 10, {}},    {k11, 3, {441}},
+              {k22, 3, {882}},  {k96, 3, {3840}}, {k22, 2, {}}};
+  for (const auto& row : rows)
+    EXPECT_EQ(frames(row.rate, row.frameRate), row.expected)
+        << row.rate.asString() << " at " << row.frameRate;
+  EXPECT_EQ(frames(SampleRate(sr48000, fx2), 3), (Counts{3840}));
+  EXPECT_EQ(frames(SampleRate(sr48000, fx1_1001), 5), (Counts{1600}));  // the one exact pulled-down NTSC case
+  EXPECT_EQ(frames(k48, 10), (Counts{800, 801, 801, 801, 801}));
+  EXPECT_EQ(frames(k96, 10), (Counts{1600, 1602, 1602, 1602, 1602}));
+  EXPECT_EQ(frames(k48, 5), (Counts{1602, 1601, 1602, 1601, 1602}));
+  EXPECT_EQ(frames(k96, 5), (Counts{3204, 3202, 3204, 3202, 3204}));
 }
 
 TEST(FrameCadence, LongCadencesOfThe1001FrameRates) {
@@ -93,91 +59,67 @@ TEST(FrameCadence, LongCadencesOfThe1001FrameRates) {
       for (unsigned n : c) EXPECT_TRUE(n == row.shortFrame || n == row.shortFrame + 1) << n;
     }
   }
-  EXPECT_EQ(frames(k48, 5), (Counts{1602, 1601, 1602, 1601, 1602}));
-  const Counts c44 = frames(k44, 5);
-  for (std::size_t k = 1; k <= 100; ++k) {
-    const bool longFrame = k % 2 == 1 && k != 23 && k != 47 && k != 71;
-    EXPECT_EQ(c44[k - 1], longFrame ? 1472u : 1471u) << k;
-  }
-  const Counts c32 = frames(k32, 6);
-  for (std::size_t k = 1; k <= 15; ++k) {
-    const bool longFrame = k % 2 == 1 || k == 4 || k == 8 || k == 12;
-    EXPECT_EQ(c32[k - 1], longFrame ? 1068u : 1067u) << k;
-  }
+  const Counts c44 = frames(k44, 5), c32 = frames(k32, 6);
+  for (std::size_t k = 1; k <= 100; ++k)
+    EXPECT_EQ(c44[k - 1], k % 2 == 1 && k != 23 && k != 47 && k != 71 ? 1472u : 1471u) << k;
+  for (std::size_t k = 1; k <= 15; ++k)
+    EXPECT_EQ(c32[k - 1], k % 2 == 1 || k == 4 || k == 8 || k == 12 ? 1068u : 1067u) << k;
 }
 
-TEST(FrameCadence, DerivedRatesScaleTheBaseCadence) {
-  EXPECT_EQ(frames(SampleRate(sr11025, fNone), 3), (Counts{441}));
-  EXPECT_EQ(frames(SampleRate(sr22050, fNone), 3), (Counts{882}));
-  EXPECT_EQ(frames(SampleRate(sr96000, fNone), 3), (Counts{3840}));
-  EXPECT_EQ(frames(SampleRate(sr96000, fNone), 5), (Counts{3204, 3202, 3204, 3202, 3204}));
-  EXPECT_EQ(frames(SampleRate(sr96000, fNone), 10), (Counts{1600, 1602, 1602, 1602, 1602}));
-  EXPECT_EQ(frames(SampleRate(sr22050, fNone), 2), (Counts{}));
-  EXPECT_EQ(frames(SampleRate(sr48000, fx2), 3), (Counts{3840}));
+TEST(FrameCadence, DerivedAndPulledDownRatesWalkTheBaseCadence) {
   // The carry joins the next frame's count before scaling, so a cycle of
   // 24/25 at 25 frames per second closes only after the longest walk.
   const Counts pal = frames(SampleRate(sr48000, fx24_25), 3);
   EXPECT_EQ(Counts(pal.begin(), pal.begin() + 12),
             (Counts{1843, 1843, 1843, 1843, 1843, 1844, 1843, 1843, 1843, 1843, 1844, 1843}));
   EXPECT_EQ(pal.size(), 108001u);
-}
-
-// Whole cycles of a derived cadence carry the base's total, scaled; each
-// frame is within a sample of its share.
-void expectWalk(SampleRate rate, int frameRate, const Counts& base, double multiplier, bool closedEarly) {
-  SCOPED_TRACE(testing::Message() << rate.calcBaseSampleRate() << " Hz x " << rate.calcFactor()
-                                  << ", frame rate " << frameRate);
-  const Counts c = frames(rate, frameRate);
-  ASSERT_FALSE(c.empty());
-  ASSERT_EQ(c.size() % base.size(), 0u);
-  std::size_t firstStray = c.size();
-  for (std::size_t i = 0; i < c.size() && firstStray == c.size(); ++i) {
-    const double share = base[i % base.size()] * multiplier;
-    if (double(c[i]) < std::floor(share) - 1.0 || double(c[i]) > std::ceil(share) + 1.0) firstStray = i;
-  }
-  ASSERT_EQ(firstStray, c.size()) << "frame " << firstStray << " has " << c[firstStray];
-  const double ideal = double(sum(base)) * double(c.size() / base.size()) * multiplier;
-  EXPECT_NEAR(double(sum(c)), ideal, 2.0);
-  if (closedEarly) {
-    EXPECT_LT(c.size(), 108000u);
-  } else {
-    EXPECT_GE(c.size(), 108000u);
-    EXPECT_LT(c.size(), 108000u + base.size() + 1);
-  }
-}
-
-TEST(FrameCadence, DerivedAndPulledDownRatesWalkTheBaseCadence) {
-  const Counts ntsc44 = frames(k44, 5), ntsc48 = frames(k48, 5), ntsc32 = frames(k32, 5);
-  expectWalk(SampleRate(sr22050, fNone), 5, ntsc44, 0.5, false);
-  expectWalk(SampleRate(sr11025, fNone), 5, ntsc44, 0.25, false);
-  expectWalk(SampleRate(sr22050, fNone), 8, {882}, 0.5, true);
-  expectWalk(SampleRate(sr48000, fx24_25), 3, {1920}, 0.96, false);
-  expectWalk(SampleRate(sr48000, fx1_1001), 3, {1920}, 1 / 1.001, false);
-  expectWalk(SampleRate(sr48000, fx1_1001), 6, ntsc48, 1 / 1.001, false);
-  expectWalk(SampleRate(sr44100, fx1_1001), 5, ntsc44, 1 / 1.001, false);
-  expectWalk(SampleRate(sr32000, fx1001), 5, ntsc32, 1.001, false);
-  expectWalk(SampleRate(sr48000, fx25_24), 1, {2000}, 25.0 / 24.0, true);
-  // Above twice the base rate the carry must not feed back on itself.
-  expectWalk(SampleRate(sr96000, fx1001), 3, {1920}, 2.002, false);
-  expectWalk(SampleRate(sr48000, fx2 | fx25_24), 5, ntsc48, 2.0 * 1.0416666666666667, true);
-  expectWalk(SampleRate(sr96000, fx2 | fx1001), 1, {2000}, 4.004, false);
-  expectWalk(SampleRate(sr96000, fx1_1001), 5, ntsc48, 2.0 / 1.001, false);
-}
-
-TEST(FrameCadence, LongWalksCloseOnTheLastEntryOfACycle) {
-  const Counts c = frames(SampleRate(sr48000, fx1_1001), 3);
-  ASSERT_EQ(c.size(), 108001u);
   // Every cycle of one frame is 1920 / 1.001 = 1918.08 samples; the closing
   // entry takes one extra sample.
-  EXPECT_EQ(c.back(), 1919u);
-  EXPECT_EQ(sum(c), static_cast<unsigned long long>(108001 * 1920 / 1.001) + 1);
+  const Counts ntsc = frames(SampleRate(sr48000, fx1_1001), 3);
+  ASSERT_EQ(ntsc.size(), 108001u);
+  EXPECT_EQ(ntsc.back(), 1919u);
+  EXPECT_EQ(sum(ntsc), static_cast<unsigned long long>(108001 * 1920 / 1.001) + 1);
+
+  // Whole cycles of a derived cadence carry the base's total, scaled; each
+  // frame is within a sample of its share; long walks stop at the first
+  // cycle end past 108000 frames.
+  const Counts ntsc44 = frames(k44, 5), ntsc48 = frames(k48, 5), ntsc32 = frames(k32, 5);
+  const struct {
+    SampleRate rate;
+    int frameRate;
+    Counts base;
+    double multiplier;
+    bool closedEarly;
+  } walks[] = {{k22, 5, ntsc44, 0.5, false},
+               {k22, 8, {882}, 0.5, true},
+               {SampleRate(sr44100, fx1_1001), 5, ntsc44, 1 / 1.001, false},
+               {SampleRate(sr32000, fx1001), 5, ntsc32, 1.001, false},
+               {SampleRate(sr48000, fx25_24), 1, {2000}, 25.0 / 24.0, true},
+               // Above twice the base rate the carry must not feed back on itself.
+               {SampleRate(sr96000, fx1001), 3, {1920}, 2.002, false},
+               {SampleRate(sr48000, fx2 | fx25_24), 5, ntsc48, 2.0 * 1.0416666666666667, true},
+               {SampleRate(sr96000, fx2 | fx1001), 1, {2000}, 4.004, false},
+               {SampleRate(sr96000, fx1_1001), 5, ntsc48, 2.0 / 1.001, false}};
+  for (const auto& w : walks) {
+    SCOPED_TRACE(testing::Message() << w.rate.calcBaseSampleRate() << " Hz x " << w.rate.calcFactor()
+                                    << ", frame rate " << w.frameRate);
+    const Counts c = frames(w.rate, w.frameRate);
+    ASSERT_FALSE(c.empty());
+    ASSERT_EQ(c.size() % w.base.size(), 0u);
+    for (std::size_t i = 0; i < c.size(); ++i) {
+      const double share = w.base[i % w.base.size()] * w.multiplier;
+      ASSERT_TRUE(c[i] >= std::floor(share) - 1.0 && c[i] <= std::ceil(share) + 1.0) << i << ": " << c[i];
+    }
+    EXPECT_NEAR(double(sum(c)), double(sum(w.base)) * double(c.size() / w.base.size()) * w.multiplier, 2.0);
+    EXPECT_EQ(c.size() < 108000u, w.closedEarly);
+    EXPECT_LT(c.size(), 108000u + (w.closedEarly ? 0 : w.base.size() + 1));
+  }
 }
 
 TEST(FrameCadence, FieldsSplitEachFrame) {
   EXPECT_EQ(fields(k48, 3), (Counts{960, 960}));
   EXPECT_EQ(fields(k48, 5), (Counts{801, 801, 800, 801, 801, 801, 800, 801, 801, 801}));
-  EXPECT_EQ(fields(SampleRate(sr11025, fNone), 3), (Counts{220, 221}));
-  EXPECT_EQ(fields(k44, 2), (Counts{}));
+  EXPECT_EQ(fields(k11, 3), (Counts{220, 221}));
   for (int frameRate = 1; frameRate <= 10; ++frameRate) {
     const Counts f = frames(k44, frameRate), g = fields(k44, frameRate);
     ASSERT_EQ(g.size(), 2 * f.size());
@@ -189,18 +131,20 @@ TEST(FrameCadence, FieldsSplitEachFrame) {
 }
 
 TEST(FrameCadence, RatesWithNoBaseCadenceAreReported) {
+  std::vector<std::string> reports;
+  host::setFatalReportHandler([&](const char* m) { reports.push_back(m); });
+  frames(k44, 2);  // no cadence, but no fault either
+  frames(SampleRate(sr22050, fx1001), 7);
+  EXPECT_TRUE(reports.empty());
   for (const SampleRate rate : {SampleRate(), SampleRate(sr16000, fNone), SampleRate(sr24000, fx1001),
                                 SampleRate(srProject, fNone), SampleRate(eBaseSampleRate(20), fNone)}) {
-    FatalReports reports;
+    reports.clear();
     EXPECT_EQ(frames(rate, 3), Counts{});
     EXPECT_EQ(fields(rate, 5), Counts{});
-    EXPECT_EQ(reports.messages(),
+    EXPECT_EQ(reports,
               (std::vector<std::string>{"Not implemented for this rate!", "Not implemented for this rate!"}));
   }
-  FatalReports none;
-  frames(k44, 2);
-  frames(SampleRate(sr22050, fx1001), 7);
-  EXPECT_TRUE(none.messages().empty());
+  host::setFatalReportHandler(nullptr);
 }
 
 }  // namespace

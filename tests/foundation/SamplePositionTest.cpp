@@ -15,6 +15,7 @@ using namespace Aud;
 constexpr int64_t kMax = std::numeric_limits<int64_t>::max();
 constexpr int64_t kMin = std::numeric_limits<int64_t>::min();
 constexpr int32_t kOne = SubSamplePos::kOne;
+constexpr double kInf = std::numeric_limits<double>::infinity();
 
 TEST(SaturatingCast, BoundsNaNAndTruncation) {
   EXPECT_EQ(saturatingCast<int64_t>(NAN), 0);
@@ -33,42 +34,28 @@ TEST(SaturatingCast, BoundsNaNAndTruncation) {
 }
 
 TEST(SubSamplePosition, NegativeZeroAndFractionalCounts) {
+  // Negative counts are whole + rest (-2.25 is -3 + 0.75); whole samples stay
+  // whole on both sides of zero; tiny rests round to zero, not to a unit
+  // below it; a rest that rounds to one sample carries. NaN and counts beyond
+  // the range saturate.
+  const double unit = 1.0 / 1073741823.0, p62 = 0x1p62;
   const struct {
-    double count;
-    int64_t whole;
-    int32_t fraction;
-  } rows[] = {{0.0, 0, 0},
-              {-0.0, 0, 0},
-              {2.25, 2, 268435456},
-              {-2.25, -3, 805306367},  // -3 + 0.75
-              {0.5, 0, 536870912},
-              {-0.5, -1, 536870911},
-              {2.0, 2, 0},
-              {-2.0, -2, 0},  // whole samples stay whole on both sides of zero
-              {-1.0, -1, 0},
-              {-1e-12, 0, 0},  // rounds to zero, not to a unit below it
-              {1e-12, 0, 0},
-              {2.9999999999, 3, 0},  // a rest that rounds to one sample carries
-              {-2.9999999999, -3, 0},
-              {-2.0000000001, -2, 0},
-              {1.0 / 1073741823.0, 0, 1},
-              {-1.0 / 1073741823.0, -1, kOne - 1},
-              {4611686018427387904.0, 4611686018427387904, 0},  // 2^62
-              {-4611686018427387904.0, -4611686018427387904, 0}};
-  for (const auto& row : rows) {
-    SCOPED_TRACE(row.count);
-    EXPECT_EQ(subSamplePosFromCount(row.count), (SubSamplePos{row.whole, row.fraction}));
+    double count, whole, fraction;
+  } rows[] = {{2.25, 2, 268435456},  {-2.25, -3, 805306367}, {0.5, 0, 536870912},
+              {-0.5, -1, 536870911}, {unit, 0, 1},           {-unit, -1, kOne - 1}};
+  for (const auto& row : rows)
+    EXPECT_EQ(subSamplePosFromCount(row.count), (SubSamplePos{int64_t(row.whole), int32_t(row.fraction)}))
+        << row.count;
+  // Each whole count also read negated.
+  const std::pair<double, int64_t> whole[] = {
+      {0.0, 0}, {2.0, 2}, {1.0, 1}, {1e-12, 0}, {2.9999999999, 3}, {2.0000000001, 2}, {p62, int64_t(p62)}};
+  for (const auto& [count, samples] : whole) {
+    EXPECT_EQ(subSamplePosFromCount(count), (SubSamplePos{samples, 0})) << count;
+    EXPECT_EQ(subSamplePosFromCount(-count), (SubSamplePos{-samples, 0})) << -count;
   }
-}
-
-TEST(SubSamplePosition, NaNAndHugeCountsSaturate) {
-  EXPECT_EQ(subSamplePosFromCount(NAN), (SubSamplePos{0, 0}));
-  EXPECT_EQ(subSamplePosFromCount(-NAN), (SubSamplePos{0, 0}));
-  EXPECT_EQ(subSamplePosFromCount(INFINITY), (SubSamplePos{kMax, 0}));
-  EXPECT_EQ(subSamplePosFromCount(-INFINITY), (SubSamplePos{kMin, 0}));
-  EXPECT_EQ(subSamplePosFromCount(1e300), (SubSamplePos{kMax, 0}));
-  EXPECT_EQ(subSamplePosFromCount(-1e300), (SubSamplePos{kMin, 0}));
-  EXPECT_EQ(subSamplePosFromCount(9223372036854775808.0), (SubSamplePos{kMax, 0}));
+  for (double count : {NAN, -NAN}) EXPECT_EQ(subSamplePosFromCount(count), (SubSamplePos{0, 0}));
+  for (double count : {kInf, 1e300, 0x1p63}) EXPECT_EQ(subSamplePosFromCount(count), (SubSamplePos{kMax, 0}));
+  for (double count : {-kInf, -1e300}) EXPECT_EQ(subSamplePosFromCount(count), (SubSamplePos{kMin, 0}));
 }
 
 TEST(SubSamplePosition, NearestUnitAndMirrorImageOverRandomCounts) {
@@ -89,41 +76,21 @@ TEST(SubSamplePosition, NearestUnitAndMirrorImageOverRandomCounts) {
   }
 }
 
-TEST(StripTime, WholeSamplePositionsTruncateTowardZero) {
-  const Kv::OutputGearing plain;
-  const Kv::OutputGearing geared{2.0, 0.5};  // clock = 2 * edit + 0.5
+TEST(StripTime, PositionsTruncateTowardZeroAndSaturate) {
+  const Kv::OutputGearing plain, geared{2.0, 0.5};  // geared: clock = 2 * edit + 0.5
   const SampleRate r48(sr48000, fNone);
-  const struct {
-    SampleRate rate;
-    eFactor f1, f2;
-    double time;
-    const Kv::OutputGearing& gearing;
-    long long position;
-  } rows[] = {
-      {r48, fNone, fNone, 1.5, plain, 72000},
-      {r48, fNone, fNone, -1.5, plain, -72000},
-      {r48, fNone, fNone, -0.00001, plain, 0},  // -0.48 samples
-      {r48, fNone, fNone, 1.5, geared, 168000},
-      {r48, fx1_1001, fNone, 1.5, plain, 71928},  // 71928.07
-      {r48, fx1_1001, fx1001, 1.5, plain, 72000},
-      {SampleRate(sr44100, fx24_25), fx2, fNone, 1.0, plain, 84672},
-      {SampleRate(sr44100, fNone), fx25_24, fNone, -1.0, plain, -45937},  // -45937.5
-      {r48, fNone, fNone, NAN, plain, 0},
-      {r48, fNone, fNone, 1e300, plain, kMax},
-      {r48, fNone, fNone, -1e300, plain, kMin},
-      {r48, fNone, fNone, INFINITY, plain, kMax},
-      {SampleRate(), fNone, fNone, INFINITY, plain, 0}  // 0 Hz x infinity is NaN
-  };
-  for (const auto& row : rows) {
-    SCOPED_TRACE(row.time);
-    EXPECT_EQ(stripTimeToSamplePos(row.rate, row.f1, row.f2, row.time, row.gearing), row.position);
-  }
-}
+  const std::pair<double, long long> times[] = {{1.5, 72000},  {-1.5, -72000}, {-0.00001, 0},   {NAN, 0},
+                                                {1e300, kMax}, {-1e300, kMin}, {INFINITY, kMax}};
+  for (const auto& [time, position] : times)
+    EXPECT_EQ(stripTimeToSamplePos(r48, fNone, fNone, time, plain), position) << time;
+  EXPECT_EQ(stripTimeToSamplePos(r48, fNone, fNone, 1.5, geared), 168000);
+  EXPECT_EQ(stripTimeToSamplePos(r48, fx1_1001, fNone, 1.5, plain), 71928);  // 71928.07
+  EXPECT_EQ(stripTimeToSamplePos(r48, fx1_1001, fx1001, 1.5, plain), 72000);
+  EXPECT_EQ(stripTimeToSamplePos(SampleRate(sr44100, fx24_25), fx2, fNone, 1.0, plain), 84672);
+  EXPECT_EQ(stripTimeToSamplePos(SampleRate(sr44100, fNone), fx25_24, fNone, -1.0, plain),
+            -45937);                                                                // -45937.5
+  EXPECT_EQ(stripTimeToSamplePos(SampleRate(), fNone, fNone, INFINITY, plain), 0);  // 0 Hz x infinity is NaN
 
-TEST(StripTime, SubSamplePositions) {
-  const Kv::OutputGearing plain;
-  const SampleRate r48(sr48000, fNone);
-  EXPECT_EQ(stripTimeToSubSamplePos(r48, fNone, fNone, 0.5, plain), (SubSamplePos{24000, 0}));
   EXPECT_EQ(stripTimeToSubSamplePos(r48, fNone, fNone, -0.5, plain), (SubSamplePos{-24000, 0}));
   EXPECT_EQ(stripTimeToSubSamplePos(r48, fx2, fx1_2, 0.5, plain), (SubSamplePos{24000, 0}));
   // 0.25 / 48000 s past sample 12 of a 48 kHz stream: 12.25 samples (within rounding of the time).
