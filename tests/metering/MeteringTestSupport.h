@@ -4,74 +4,46 @@
 
 #include <atomic>
 #include <cstring>
-#include <mutex>
 #include <string>
 #include <vector>
 
 #include "host/HostHooks.h"
-#include "host/Ptr.h"
-#include "tonebits/foundation/Aud__StreamBuffer.h"
 #include "tonebits/metering/Aud__Monitor.h"
 #include "tonebits/metering/Aud__MonitoringPoint.h"
-#include "tonebits/metering/Aud__MonitoringPointManager.h"
 
 namespace metering_test {
 
 // service_get_msecs_precise reads `now` while this lives.
-class ManualClock {
- public:
+struct ManualClock {
   ManualClock() {
-    host::setClock([this] { return now_.load(std::memory_order_relaxed); });
+    host::setClock([this] { return now.load(); });
   }
   ~ManualClock() { host::setClock({}); }
-  void set(double ms) { now_.store(ms, std::memory_order_relaxed); }
-  void advance(double ms) {
-    now_.store(now_.load(std::memory_order_relaxed) + ms, std::memory_order_relaxed);
-  }
-
- private:
-  std::atomic<double> now_{1000.0};
+  void set(double ms) { now = ms; }
+  void advance(double ms) { now = now.load() + ms; }  // one advancing thread at a time
+  std::atomic<double> now{1000.0};
 };
 
-// Collects vel_splat reports and log lines while it lives.
-class Capture {
- public:
+// Collects vel_splat reports and log lines, in one list, while it lives.
+struct Capture {
   Capture() {
-    host::setFatalReportHandler([this](const char* m) { add(fatal_, m); });
-    host::setLogSink([this](const char* t) { add(log_, t); });
+    host::setFatalReportHandler([this](const char* m) { lines.emplace_back(m); });
+    host::setLogSink([this](const char* t) { lines.emplace_back(t); });
   }
   ~Capture() {
     host::setFatalReportHandler({});
     host::setLogSink({});
   }
-  std::vector<std::string> fatal() const { return get(fatal_); }
-  std::vector<std::string> log() const { return get(log_); }
-
- private:
-  void add(std::vector<std::string>& to, const char* text) {
-    std::lock_guard lock(mutex_);
-    to.emplace_back(text);
-  }
-  std::vector<std::string> get(const std::vector<std::string>& from) const {
-    std::lock_guard lock(mutex_);
-    return from;
-  }
-  mutable std::mutex mutex_;
-  std::vector<std::string> fatal_, log_;
+  std::vector<std::string> lines;
 };
 
 struct Point {
   IdStamp pointId, writerId;
 };
 
-inline Aud::MonitoringPointInfo describe(const char* name, unsigned char code = 7) {
+inline Aud::MonitoringPointInfo describe(const char* name) {
   Aud::MonitoringPointInfo info;
-  info.code = code;
   info.text1 = name;
-  info.text2 = "second";
-  info.text3 = "third";
-  info.flag = true;
-  info.value = -12.5f;
   return info;
 }
 
@@ -82,8 +54,7 @@ inline Point registerPoint(const char* name = "test point") {
 }
 
 // A monitor whose protected operations the tests drive.
-class TestMonitor : public Aud::Monitor {
- public:
+struct TestMonitor : Aud::Monitor {
   virtual ~TestMonitor() = default;
   using Aud::Monitor::registerMonitoringPoints;
   using Aud::Monitor::updateMonitoringPoints;
@@ -91,13 +62,35 @@ class TestMonitor : public Aud::Monitor {
   std::size_t inputs() const { return inputPointIds.size(); }
 };
 
-// A block holding `bytes`, whose memory is exactly that size.
+// Readers on every input, each left with a taken peak of 0.5, so that the
+// next write replaces it and no write leaves it (while the clock stands).
+inline std::vector<Aud::MonitoringPointReader> primedReaders(TestMonitor& monitor) {
+  std::vector<Aud::MonitoringPointReader> readers;
+  readers.reserve(monitor.inputs());  // a copied reader starts afresh
+  for (unsigned i = 0; i < monitor.inputs(); ++i) {
+    readers.emplace_back(monitor.getInputMonitoringPointId(i));
+    Aud::MonitoringPointWriter(monitor.writerId(i)).updatePeakSampleValue(0.5f);
+    readers.back().peakValue(true);
+    readers.back().hasClipped(true);
+  }
+  return readers;
+}
+
+// A buffer holding `bytes`, whose memory is exactly that size.
 inline Aud::StreamBuffer bufferOf(const std::vector<unsigned char>& bytes, unsigned numSamples, int type) {
   Aud::StreamBuffer b(0, numSamples, type);
   b.buffer = Kv::Ptr<iMemHolder>(new ByteBufferImpl(bytes.size()));
   if (!bytes.empty()) std::memcpy(b.buffer->getBuffer(), bytes.data(), bytes.size());
   b.valid = true;
   return b;
+}
+
+inline Aud::StreamBufferList listOf(std::vector<Aud::StreamBuffer> buffers, unsigned numSamples, int type) {
+  Aud::StreamBufferList list;
+  list.buffers.assign(buffers.begin(), buffers.end());
+  list.numSamples = numSamples;
+  list.sampleType = type;
+  return list;
 }
 
 template <class T>
