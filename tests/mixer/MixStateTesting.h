@@ -1,50 +1,35 @@
 // Helpers shared by the mixer state tests: a byte writer that builds
-// expected streams independently of the stream classes, random states, an
-// entry-by-entry comparison, and a capture of fatal reports.
+// expected streams independently of the stream classes, random states and
+// an entry-by-entry comparison.
 #pragma once
 
 #include <gtest/gtest.h>
 
+#include <bit>
 #include <cstdint>
-#include <cstring>
-#include <functional>
 #include <random>
 #include <string>
 #include <vector>
 
-#include "host/HostHooks.h"
 #include "tonebits/mixer/Aud__SimpleMixState.h"
 
 namespace mixtest {
 
+using Aud::SimpleMixState;
+
 struct Bytes {
   std::vector<uint8_t> data;
-  Bytes& u8(unsigned v) {
-    data.push_back(static_cast<uint8_t>(v));
-    return *this;
-  }
+  Bytes& u8(unsigned v) { return data.push_back(static_cast<uint8_t>(v)), *this; }
   Bytes& u16(unsigned v) { return u8(v & 0xFF).u8((v >> 8) & 0xFF); }
   Bytes& u32(uint32_t v) { return u16(v & 0xFFFF).u16(v >> 16); }
-  Bytes& f32(float v) {
-    uint32_t bits;
-    std::memcpy(&bits, &v, 4);
-    return u32(bits);
-  }
-  // The record framing: a 32-bit count, then the bytes.
+  Bytes& f32(float v) { return u32(std::bit_cast<uint32_t>(v)); }
+  Bytes& append(const std::vector<uint8_t>& b) { return data.insert(data.end(), b.begin(), b.end()), *this; }
+  Bytes& append(const Bytes& b) { return append(b.data); }
+  // A 32-bit count, then the bytes.
   Bytes& record(const std::string& s) {
-    u32(static_cast<uint32_t>(s.size()));
-    data.insert(data.end(), s.begin(), s.end());
-    return *this;
+    return u32(static_cast<uint32_t>(s.size())).append(std::vector<uint8_t>(s.begin(), s.end()));
   }
-  Bytes& block(const std::vector<uint8_t>& b) {
-    u32(static_cast<uint32_t>(b.size()));
-    data.insert(data.end(), b.begin(), b.end());
-    return *this;
-  }
-  Bytes& append(const Bytes& other) {
-    data.insert(data.end(), other.data.begin(), other.data.end());
-    return *this;
-  }
+  Bytes& block(const std::vector<uint8_t>& b) { return u32(static_cast<uint32_t>(b.size())).append(b); }
   // A version-2 chunk header.
   Bytes& header(const std::string& name, unsigned major, unsigned minor, uint32_t own, uint32_t total) {
     return record(name).u8(major).u8(minor).u32(own).u32(total);
@@ -55,77 +40,68 @@ struct Bytes {
 // The root and Taggable chunks in front of a layer chunk of `nested` bytes.
 inline Bytes baseChunks(std::size_t nested, const IdStamp& tag = IdStamp::invalidStamp()) {
   Bytes b;
-  const uint32_t tagChunk = static_cast<uint32_t>(4 + 2 + 2 + 8 + 12 + nested);
-  b.header("$", 2, 0, 0, tagChunk);
+  b.header("$", 2, 0, 0, static_cast<uint32_t>(28 + nested));
   b.header("TG", 1, 0, 12, static_cast<uint32_t>(12 + nested));
   for (int i = 0; i < 3; ++i) b.u32(tag.word(i));
   return b;
 }
 
-inline uint32_t bitsOf(float v) {
-  uint32_t b;
-  std::memcpy(&b, &v, 4);
-  return b;
-}
+struct Dims {
+  int ni, nm, no;
+};
+constexpr Dims kEverywhere{1 << 20, 1 << 20, 1 << 20};
 
-// Entry-by-entry equality through the accessors (floats bit for bit).
-inline void expectSameEntries(Aud::SimpleMixState& a, Aud::SimpleMixState& b, int ni, int nm, int no,
-                              bool muteSolo = true) {
-  for (int i = 0; i < ni; ++i) {
+// Entry-by-entry equality of a (with user counts n) through the accessors,
+// floats bit for bit: entries within `from` are compared with b, the others
+// with `rest`; mutes and solos with `rest` too unless `muteSolo`.
+inline void expectSameEntries(SimpleMixState& a, SimpleMixState& b, Dims n, bool muteSolo = true,
+                              Dims from = kEverywhere, SimpleMixState* rest = nullptr) {
+  auto ref = [&](bool inB) -> SimpleMixState& { return inB || !rest ? b : *rest; };
+  for (int i = 0; i < n.ni; ++i) {
     SCOPED_TRACE("input " + std::to_string(i));
-    EXPECT_EQ(bitsOf(a.getInputLevel(i)), bitsOf(b.getInputLevel(i)));
-    EXPECT_EQ(bitsOf(a.getInputPan(i)), bitsOf(b.getInputPan(i)));
-    if (muteSolo) {
-      EXPECT_EQ(a.getInputMuteState(i), b.getInputMuteState(i));
-      EXPECT_EQ(a.getInputSoloState(i), b.getInputSoloState(i));
-    }
-    for (int m = -1; m < nm; ++m) EXPECT_EQ(a.getInputRoutedToMix(i, m), b.getInputRoutedToMix(i, m)) << m;
+    SimpleMixState& r = ref(i < from.ni);
+    SimpleMixState& flags = muteSolo ? r : *rest;
+    EXPECT_EQ(std::bit_cast<uint32_t>(a.getInputLevel(i)), std::bit_cast<uint32_t>(r.getInputLevel(i)));
+    EXPECT_EQ(std::bit_cast<uint32_t>(a.getInputPan(i)), std::bit_cast<uint32_t>(r.getInputPan(i)));
+    EXPECT_EQ(a.getInputMuteState(i), flags.getInputMuteState(i));
+    EXPECT_EQ(a.getInputSoloState(i), flags.getInputSoloState(i));
+    for (int m = -1; m < n.nm; ++m)
+      EXPECT_EQ(a.getInputRoutedToMix(i, m), ref(i < from.ni && m < from.nm).getInputRoutedToMix(i, m)) << m;
   }
-  for (int m = -1; m < nm; ++m) {
+  for (int m = -1; m < n.nm; ++m) {
     SCOPED_TRACE("mix " + std::to_string(m));
-    EXPECT_EQ(bitsOf(a.getMixLevel(m)), bitsOf(b.getMixLevel(m)));
-    if (muteSolo) {
-      EXPECT_EQ(a.getMixMuteState(m), b.getMixMuteState(m));
-      EXPECT_EQ(a.getMixSoloState(m), b.getMixSoloState(m));
-    }
-    for (int o = -2; o < no; ++o) {
-      EXPECT_EQ(a.getMixRoutedToOutput(m, o, true), b.getMixRoutedToOutput(m, o, true)) << o;
-      EXPECT_EQ(a.getMixRoutedToOutput(m, o, false), b.getMixRoutedToOutput(m, o, false)) << o;
-    }
+    SimpleMixState& r = ref(m < from.nm);
+    SimpleMixState& flags = muteSolo ? r : *rest;
+    EXPECT_EQ(std::bit_cast<uint32_t>(a.getMixLevel(m)), std::bit_cast<uint32_t>(r.getMixLevel(m)));
+    EXPECT_EQ(a.getMixMuteState(m), flags.getMixMuteState(m));
+    EXPECT_EQ(a.getMixSoloState(m), flags.getMixSoloState(m));
+    for (int o = -2; o < n.no; ++o)
+      for (bool left : {true, false})
+        EXPECT_EQ(a.getMixRoutedToOutput(m, o, left),
+                  ref(m < from.nm && o < from.no).getMixRoutedToOutput(m, o, left))
+            << o << (left ? "L" : "R");
   }
 }
 
 // Fills a state (made with the user's counts) with random settings through
 // its setters. Levels are drawn so that ten decimals give them back exactly.
-inline void randomize(Aud::SimpleMixState& s, int ni, int nm, int no, std::mt19937& rng) {
+inline void randomize(SimpleMixState& s, Dims n, std::mt19937& rng) {
   std::uniform_real_distribution<float> level(0.01f, 1.5f), pan(0.0f, 1.0f);
   std::bernoulli_distribution coin(0.5);
-  for (int i = 0; i < ni; ++i) {
+  for (int i = 0; i < n.ni; ++i) {
     s.setInputLevel(i, level(rng));
     s.setInputPan(i, pan(rng) + 0.01f);
     s.setInputMuteState(i, coin(rng));
     s.setInputSoloState(i, coin(rng));
-    for (int m = -1; m < nm; ++m) s.setInputRoutedToMix(i, m, coin(rng));
+    for (int m = -1; m < n.nm; ++m) s.setInputRoutedToMix(i, m, coin(rng));
   }
-  for (int m = -1; m < nm; ++m) {
+  for (int m = -1; m < n.nm; ++m) {
     s.setMixLevel(m, level(rng));
     s.setMixMuteState(m, coin(rng));
     s.setMixSoloState(m, coin(rng));
-    for (int o = -2; o < no; ++o) {
-      s.setMixRoutedToOutput(m, o, true, coin(rng));
-      s.setMixRoutedToOutput(m, o, false, coin(rng));
-    }
+    for (int o = -2; o < n.no; ++o)
+      for (bool left : {true, false}) s.setMixRoutedToOutput(m, o, left, coin(rng));
   }
 }
-
-// Captures vel_splat reports for its lifetime.
-class FatalReports {
- public:
-  FatalReports() {
-    host::setFatalReportHandler([this](const char* m) { messages.emplace_back(m); });
-  }
-  ~FatalReports() { host::setFatalReportHandler({}); }
-  std::vector<std::string> messages;
-};
 
 }  // namespace mixtest
