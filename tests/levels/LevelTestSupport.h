@@ -25,15 +25,14 @@ inline constexpr Store::eNodeType N = Store::Normal, SG = Store::StartGuard, EG 
 inline std::vector<Node> parse(const std::string& text) {
   std::vector<Node> out;
   std::istringstream in(text);
-  for (std::string word; in >> word;) {
-    const std::size_t kind = std::string("NSEM").find(word[0]);
+  for (std::string w; in >> w;) {
+    const std::size_t k = std::string("NSEM").find(w[0]), kind = k == std::string::npos ? 0 : k;
     char* end = nullptr;
-    const double t = std::strtod(word.c_str() + (kind == std::string::npos ? 0 : 1), &end);
-    if (*end != ':') throw std::invalid_argument(word);
+    const double t = std::strtod(w.c_str() + (k == std::string::npos ? 0 : 1), &end);
+    if (*end != ':') throw std::invalid_argument(w);
     const float level = std::strtof(end + 1, &end);
-    if (*end != '\0' && std::string(end) != "*") throw std::invalid_argument(word);
-    out.emplace_back(t, level, static_cast<Store::eNodeType>(kind == std::string::npos ? 0 : kind),
-                     *end == '*');
+    if (*end != '\0' && std::string(end) != "*") throw std::invalid_argument(w);
+    out.emplace_back(t, level, static_cast<Store::eNodeType>(kind), *end == '*');
   }
   return out;
 }
@@ -57,10 +56,6 @@ inline Fields fields(Store& s) {
   std::vector<Node> nodes;
   for (Store::iterator it = s.begin(); it != s.end(); ++it) nodes.push_back(it.getNode());
   return fields(nodes);
-}
-inline bool ordered(Store& s) {
-  const Fields f = fields(s);
-  return std::is_sorted(f.begin(), f.end(), [](auto& a, auto& b) { return std::get<0>(a) < std::get<0>(b); });
 }
 
 // Sets the project frame duration for a scope.
