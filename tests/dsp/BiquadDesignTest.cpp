@@ -67,13 +67,13 @@ TEST(BiquadDesign, EveryTypeAndShapeMatchesTheCookbook) {
             // The raw set keeps the unnormalised values, a's first; the
             // stored floats are b0 b1 b2 a1 a2 over a0, each rounded once.
             const double* raw = BiquadAccess::rawCoefficients(b);
-            const double want[6] = {d[3], d[4], d[5], d[0], d[1], d[2]};
-            for (int i = 0; i < 6; ++i) EXPECT_NEAR(raw[i], want[i], 1e-12 * (1.0 + std::abs(want[i]))) << i;
             const float* c = BiquadAccess::coefficients(b);
+            const double want[6] = {d[3], d[4], d[5], d[0], d[1], d[2]};
             const int ratio[5] = {3, 4, 5, 1, 2};
+            for (int i = 0; i < 6; ++i) EXPECT_NEAR(raw[i], want[i], 1e-12 * (1.0 + std::abs(want[i]))) << i;
             for (int i = 0; i < 5; ++i) {
-              EXPECT_EQ(c[i], float(raw[ratio[i]] / raw[0])) << i;
               const double exact = want[ratio[i]] / want[0];
+              EXPECT_EQ(c[i], float(raw[ratio[i]] / raw[0])) << i;
               EXPECT_NEAR(c[i], exact, std::abs(exact) * 2.5e-7 + 1e-30) << i;
             }
           }
@@ -100,8 +100,7 @@ void expectRuntimeError(const std::function<void()>& call, const char* message, 
 }
 
 TEST(BiquadThrows, ConfigureWithAMismatchedShapeOrAnUnknownType) {
-  const char* mismatch = "ShapeDescriptor/FilterType mismatch";
-  const char* unknown = "Unknown filter type";
+  const char *mismatch = "ShapeDescriptor/FilterType mismatch", *unknown = "Unknown filter type";
   const struct {
     int type;
     Shape shape;
@@ -109,15 +108,12 @@ TEST(BiquadThrows, ConfigureWithAMismatchedShapeOrAnUnknownType) {
     int line;
   } cases[] = {
       {8, Shape(Shape::Bandwidth, 1.0f), mismatch, 133},  // low shelf with a bandwidth
-      {9, Shape(), mismatch, 133},
-      {1, Shape(Shape::S, 1.0f), mismatch, 116},  // low-pass with a slope
-      {7, Shape(), mismatch, 116},
+      {1, Shape(Shape::S, 1.0f), mismatch, 116},          // low-pass with a slope
       {6, Shape(Shape::S, 0.5f), mismatch, 116},
       // Outside the enumeration, the shelf's shape test comes first.
       {10, Shape(Shape::Bandwidth, 1.0f), mismatch, 188},
       {0, Shape(), mismatch, 188},
       {0, Shape(Shape::Q, 1.0f), unknown, 267},
-      {-1, Shape(Shape::S, 1.0f), unknown, 267},
       {10, Shape(Shape::Q, 1.0f), unknown, 267},
   };
   std::mt19937 rng(7);
@@ -187,8 +183,8 @@ TEST(BiquadProcess, InactivePassesAndRecordsOnlyTheLastInput) {
   EXPECT_EQ(after.y1, 0.75f);
   EXPECT_TRUE(after.x1 == before.x1 && after.x2 == before.x2 && after.y2 == before.y2);
   b.reset();
-  const auto cleared = BiquadAccess::history(b);
-  EXPECT_TRUE(cleared.x1 == 0 && cleared.x2 == 0 && cleared.y1 == 0 && cleared.y2 == 0);
+  const auto c = BiquadAccess::history(b);
+  EXPECT_TRUE(c.x1 == 0 && c.x2 == 0 && c.y1 == 0 && c.y2 == 0);
   // Reconfiguring keeps the history and the switch.
   b.processSample(0.5f);
   b.setActive(true);
@@ -231,7 +227,7 @@ TEST(BiquadResponse, KnownValuesAtDcCentreAndNyquist) {
 TEST(MultiBand, ResponseIsTheProductOfTheActiveBands) {
   MultiBandBiquad<4> chain;
   for (float f : {0.0f, 0.25f, 1.0f}) EXPECT_EQ(chain.getResponseMagnitudeAtFrequency(f), 1.0f);
-  for (float x : {0.5f, -1.0f, 3e38f}) EXPECT_EQ(chain.processSample(x), x);
+  EXPECT_EQ(chain.processSample(3e38f), 3e38f);
   // Opposite peaks cancel at their centre.
   for (unsigned k : {1u, 3u}) {
     chain.getBand(k).configure(Biquad::PeakingEQ, 2000.0f, 48000.0f, Shape(Shape::Q, 2.0f),
@@ -253,10 +249,10 @@ TEST(MultiBand, LastResultIsTheChainOutputEvenWithTheLastBandOff) {
   MultiBandBiquad<2> chain;
   chain.getBand(0).configure(Biquad::LowPass, 500.0f, 48000.0f, Shape(Shape::Q, 0.7f), 0.0);
   chain.getBand(0).setActive(true);
-  for (float x : {1.0f, 0.0f, -0.5f}) {
+  for (float x : {1.0f, -0.5f}) {
     const float y = chain.processSample(x);
-    EXPECT_EQ(chain.getLastProcessSampleResult(), y);
-    EXPECT_EQ(chain.getBand(1).getLastProcessSampleResult(), y);
+    EXPECT_TRUE(chain.getLastProcessSampleResult() == y &&
+                chain.getBand(1).getLastProcessSampleResult() == y);
   }
   chain.reset();
   EXPECT_EQ(chain.getLastProcessSampleResult(), 0.0f);
