@@ -19,6 +19,11 @@ namespace {
 using namespace levels_test;
 using Aud::DynamicLevelControl::DynamicLevelApplyingIterator;
 
+bool ordered(Store& s) {
+  const Fields f = fields(s);
+  return std::is_sorted(f.begin(), f.end(), [](auto& a, auto& b) { return std::get<0>(a) < std::get<0>(b); });
+}
+
 constexpr double kRate = 48000.0;
 // Nodes sit on a 20 ms grid over [0, 1] s with levels in [0, 1], so a segment
 // runs at least 10 ms (reverse into an end guard) and a glide spans 480
