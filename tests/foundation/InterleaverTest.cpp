@@ -1,7 +1,6 @@
 #include <gtest/gtest.h>
 
 #include <cmath>
-#include <cstdint>
 #include <cstring>
 #include <limits>
 #include <random>
@@ -32,8 +31,8 @@ struct ViewHolder final : iMemHolder {
   std::size_t size, used;
 };
 
-Kv::Ptr<iMemHolder> view(Bytes& storage, std::size_t offset, std::size_t bytes) {
-  return Kv::Ptr<iMemHolder>(new ViewHolder(storage.data() + offset, bytes));
+Kv::Ptr<iMemHolder> view(Bytes& storage, std::size_t offset = 0) {
+  return Kv::Ptr<iMemHolder>(new ViewHolder(storage.data() + offset, storage.size() - offset));
 }
 
 // Every level this CPU runs, the scalar reference first.
@@ -96,12 +95,9 @@ void expectBlocks(const Aud::StreamBufferList& list, const std::vector<Bytes>& e
   ASSERT_EQ(list.buffers.size(), expected.size());
   ASSERT_EQ(list.numSamples, groups);
   for (std::size_t c = 0; c < expected.size(); ++c) {
-    const Aud::StreamBuffer& block = list.buffers[c];
-    ASSERT_TRUE(block.valid);
-    ASSERT_GE(block.getBufferSize(), groups * bytes);
     const std::size_t compare = aes ? groups * 2 : groups * bytes;
-    ASSERT_EQ(0, compare ? std::memcmp(block.getBuffer(), expected[c].data(), compare) : 0)
-        << "channel " << c;
+    ASSERT_TRUE(list.buffers[c].valid && list.buffers[c].getBufferSize() >= groups * bytes) << c;
+    ASSERT_EQ(0, compare ? std::memcmp(list.buffers[c].getBuffer(), expected[c].data(), compare) : 0) << c;
   }
 }
 
@@ -110,7 +106,7 @@ void expectWritten(const uint8_t* dst, std::size_t size, const Bytes& written) {
   for (std::size_t i = 0; i < size; ++i) EXPECT_EQ(dst[i], i < written.size() ? written[i] : 0xAA) << i;
 }
 
-TEST(AudioInterleaver, ChannelCountsAndCopies) {
+TEST(AudioInterleaver, ChannelCountsCopiesAndTheOutputBuffer) {
   for (unsigned n : {0u, 33u, 1u, 32u}) {
     IL il = with(Aud::Metadata(2, 3, 48000, 1));
     const Status want = n == 0 || n == 33 ? IL::eInvalidChannelCount : IL::eOk;
@@ -129,11 +125,27 @@ TEST(AudioInterleaver, ChannelCountsAndCopies) {
   IL copy(il), assigned;
   assigned = il;
   for (const IL* other : {&copy, &assigned}) {
-    EXPECT_EQ(other->getLastError(), IL::eInvalidChannelCount);
-    EXPECT_EQ(other->getAudioFormat().getChannelsPerStream(), 2u);
-    EXPECT_EQ(other->getOutputBuffer(), nullptr);
-    EXPECT_EQ(other->getOutputBufferSize(), 0u);
+    EXPECT_TRUE(other->getLastError() == IL::eInvalidChannelCount &&
+                other->getAudioFormat().getChannelsPerStream() == 2);
+    EXPECT_TRUE(other->getOutputBuffer() == nullptr && other->getOutputBufferSize() == 0);
   }
+  // The output buffer grows and never shrinks.
+  IL grow(1, 2, Aud::eDataTypePCM);
+  const Bytes big = randomBytes(2000, 3), small = randomBytes(20, 4);
+  ASSERT_EQ(grow.writeSamplesPlanar({big.data(), big.data()}, 1000), IL::eOk);
+  const unsigned char* buffer = grow.getOutputBuffer();
+  ASSERT_EQ(grow.writeSamplesPlanar({small.data(), small.data()}, 10), IL::eOk);
+  EXPECT_TRUE(grow.getOutputBuffer() == buffer && grow.getOutputBufferSize() == 4000);
+  EXPECT_TRUE(!std::memcmp(buffer, small.data(), 2) && !std::memcmp(buffer + 2, small.data(), 2));
+
+  // An unknown sample type writes nothing, logs, and is no error.
+  std::string logged;
+  host::setLogSink([&](const char* text) { logged += text; });
+  IL unknown = with(format(2, 2, 16, false, 9));
+  EXPECT_EQ(unknown.writeSamplesPlanar({small.data(), small.data()}, 4), IL::eOk);
+  host::setLogSink({});
+  EXPECT_NE(logged.find("WavExport: Mixer buffer sample format not supported!"), std::string::npos);
+  EXPECT_EQ(unknown.getOutputBufferSize(), 16u);
 }
 
 TEST(AudioInterleaver, RawCopyHelpers) {
@@ -146,17 +158,16 @@ TEST(AudioInterleaver, RawCopyHelpers) {
 
   // Big-endian slots of 2 to 4 bytes are reversed; other strides write nothing.
   uint8_t src[] = {0x12, 0x34, 0x56, 0x78, 0x9A, 0xBC, 0xDE, 0xF0};
-  struct Row {
+  const struct {
     unsigned stride, count;
     int result;
     Bytes written;
-  };
-  const Row rows[] = {{2, 2, 4, {0x34, 0x12, 0x78, 0x56}},
-                      {3, 2, 6, {0x56, 0x34, 0x12, 0xBC, 0x9A, 0x78}},
-                      {4, 2, 8, {0x78, 0x56, 0x34, 0x12, 0xF0, 0xDE, 0xBC, 0x9A}},
-                      {5, 1, 5, {}},
-                      {0, 3, 0, {}}};
-  for (const Row& row : rows) {
+  } rows[] = {{2, 2, 4, {0x34, 0x12, 0x78, 0x56}},
+              {3, 2, 6, {0x56, 0x34, 0x12, 0xBC, 0x9A, 0x78}},
+              {4, 2, 8, {0x78, 0x56, 0x34, 0x12, 0xF0, 0xDE, 0xBC, 0x9A}},
+              {5, 1, 5, {}},
+              {0, 3, 0, {}}};
+  for (const auto& row : rows) {
     std::memset(dst, 0xAA, sizeof dst);
     EXPECT_EQ(with(format(1, row.stride, 16, true)).copyBigEndianAudioToBuff(dst, src, row.count),
               row.result);
@@ -171,17 +182,16 @@ TEST(AudioInterleaver, RawCopyHelpers) {
     const uint32_t word = uint32_t(w + 1) << 11;
     std::memcpy(mxf + 4 * w, &word, 4);
   }
-  struct MxfRow {
+  const struct {
     unsigned channels;
     int srcBytes, channel, result;
     Bytes written;
-  };
-  const MxfRow mxfRows[] = {
+  } mxfRows[] = {
       {2, 20, 1, 4, {2, 0, 4, 0}}, {2, 20, 0, 4, {1, 0, 3, 0}}, {2, 7, 0, 0, {}},
       {2, -8, 0, 0, {}},           {2, 20, 2, 0, {}},           {2, 20, -1, 0, {}},
       {0, 20, 0, 0, {}},           {5, 20, 4, 2, {5, 0}},       {3, 20, 2, 2, {3, 0}},
   };
-  for (const MxfRow& row : mxfRows) {
+  for (const auto& row : mxfRows) {
     std::memset(dst, 0xAA, sizeof dst);
     const IL il = with(format(row.channels, 4, 32, false, 1, Aud::eDataTypeAES));
     EXPECT_EQ(il.deinterleaveMxfAudioToBuff(dst, mxf, row.srcBytes, row.channel), row.result)
@@ -211,17 +221,14 @@ TEST(AudioInterleaver, DeinterleaveRefusesWhatWouldReadOutOfBounds) {
     Aud::StreamBufferList out;
     out.numSamples = 77;
     out.buffers.resize(3);
-    EXPECT_EQ(il.deinterleaveAudio(view(data, 0, data.size()), out), Status(row.status));
-    EXPECT_EQ(out.numSamples, 77u);
-    EXPECT_EQ(out.buffers.size(), 3u);
-    EXPECT_EQ(data, before);
+    EXPECT_EQ(il.deinterleaveAudio(view(data), out), Status(row.status));
+    EXPECT_TRUE(out.numSamples == 77 && out.buffers.size() == 3 && data == before);
     EXPECT_EQ(il.getLastError(), IL::eOk);
   }
-  IL il(1, 2, Aud::eDataTypePCM);
   Aud::StreamBufferList out;
-  EXPECT_EQ(il.deinterleaveAudio(Kv::Ptr<iMemHolder>(), out), IL::eNoData);
   Bytes empty;
-  EXPECT_EQ(il.deinterleaveAudio(view(empty, 0, 0), out), IL::eNoData);
+  EXPECT_EQ(IL(1, 2, Aud::eDataTypePCM).deinterleaveAudio(Kv::Ptr<iMemHolder>(), out), IL::eNoData);
+  EXPECT_EQ(IL(1, 2, Aud::eDataTypePCM).deinterleaveAudio(view(empty), out), IL::eNoData);
 }
 
 TEST(AudioInterleaver, SingleChannelSharesTheSource) {
@@ -230,52 +237,35 @@ TEST(AudioInterleaver, SingleChannelSharesTheSource) {
     Bytes data = randomBytes(2 * stride + 1, stride);
     Bytes want = expectedBlocks(data.data(), 2, 1, stride, stride, bigEndian, false)[0];
     want.push_back(data.back());
-    const IL il = with(format(1, stride, 8 * stride, bigEndian));
-    const Kv::Ptr<iMemHolder> src = view(data, 0, data.size());
+    const Kv::Ptr<iMemHolder> src = view(data);
     Aud::StreamBufferList out;
     out.buffers.resize(4);
-    ASSERT_EQ(il.deinterleaveAudio(src, out), IL::eOk);
+    ASSERT_EQ(with(format(1, stride, 8 * stride, bigEndian)).deinterleaveAudio(src, out), IL::eOk);
     EXPECT_EQ(data, want) << stride;
     ASSERT_EQ(out.buffers.size(), 1u);
-    EXPECT_TRUE(out.buffers[0].buffer == src);
-    EXPECT_TRUE(out.buffers[0].valid);
-    EXPECT_EQ(out.buffers[0].numSamples, 2u);
-    EXPECT_EQ(out.numSamples, 2u);
-    EXPECT_EQ(out.sampleType, 1);
+    EXPECT_TRUE(out.buffers[0].buffer == src && out.buffers[0].valid && out.buffers[0].numSamples == 2);
+    EXPECT_TRUE(out.numSamples == 2 && out.sampleType == 1);
   }
 }
 
 TEST(AudioInterleaver, SlotsKeepTheirSignificantBytes) {
-  // 24 bits in 4-byte slots arrive packed, as type 2.
-  Bytes data = {0x01, 0x02, 0x03, 0xF1, 0x11, 0x12, 0x13, 0xF2,
-                0x21, 0x22, 0x23, 0xF3, 0x31, 0x32, 0x33, 0xF4};
   Aud::StreamBufferList out;
-  ASSERT_EQ(IL(5, 2, Aud::eDataTypePCM).deinterleaveAudio(view(data, 0, data.size()), out), IL::eOk);
-  EXPECT_EQ(out.sampleType, 2);
-  EXPECT_EQ(out.buffers[0].sampleType, 2);
-  expectBlocks(out, {{0x01, 0x02, 0x03, 0x21, 0x22, 0x23}, {0x11, 0x12, 0x13, 0x31, 0x32, 0x33}}, 2, 3);
-  EXPECT_EQ(out.buffers[1].buffer->getUsed(), 6u);
-
   // Type 0 is 24 bits in 4 bytes too: 3 bytes of each slot are kept, yet a
   // reader going by the type reads 4 per sample, so the block has room for 4.
-  data = randomBytes(2 * 4 * 5, 12);
-  ASSERT_EQ(IL(0, 2, Aud::eDataTypePCM).deinterleaveAudio(view(data, 0, data.size()), out), IL::eOk);
+  Bytes data = randomBytes(2 * 4 * 5, 12);
+  ASSERT_EQ(IL(0, 2, Aud::eDataTypePCM).deinterleaveAudio(view(data), out), IL::eOk);
   EXPECT_EQ(out.sampleType, 0);
   expectBlocks(out, expectedBlocks(data.data(), 5, 2, 4, 3, false, false), 5, 3);
-  for (const Aud::StreamBuffer& block : out.buffers) {
-    EXPECT_EQ(block.buffer->getUsed(), 15u);
-    EXPECT_GE(block.getBufferSize(), 20u);
-  }
+  for (const Aud::StreamBuffer& block : out.buffers)
+    EXPECT_TRUE(block.buffer->getUsed() == 15 && block.getBufferSize() >= 20);
 
   // AES words are read where their own slot starts, group after group.
   for (unsigned bits : {16u, 24u, 32u, 64u}) {
     const unsigned stride = bits == 64 ? 8 : 4;
     data = randomBytes(3 * 5 * stride + 2, bits);
-    Aud::StreamBufferList aes;
-    ASSERT_EQ(with(format(3, stride, bits, false, -1, Aud::eDataTypeAES))
-                  .deinterleaveAudio(view(data, 0, data.size()), aes),
+    ASSERT_EQ(with(format(3, stride, bits, false, -1, Aud::eDataTypeAES)).deinterleaveAudio(view(data), out),
               IL::eOk);
-    expectBlocks(aes, expectedBlocks(data.data(), 5, 3, stride, bits / 8, false, true), 5, bits / 8, true);
+    expectBlocks(out, expectedBlocks(data.data(), 5, 3, stride, bits / 8, false, true), 5, bits / 8, true);
   }
 }
 
@@ -294,12 +284,10 @@ void checkSplit(const SplitCase& k, std::size_t groups, std::size_t offset, uint
   const IL il = with(format(k.channels, k.stride, 8 * k.bytes + 7, k.swap, type));
   for (eLevel level : levels()) {
     Aud::Simd::setActiveLevel(level);
-    SCOPED_TRACE(::testing::Message()
-                 << Aud::Simd::levelName(level) << ": " << k.channels << " x " << k.stride << "/" << k.bytes
-                 << " swap " << k.swap << ", " << groups << " +" << offset);
+    SCOPED_TRACE(::testing::Message() << Aud::Simd::levelName(level) << " seed " << seed);
     Bytes copy = storage;  // the source must be left as it was
     Aud::StreamBufferList out;
-    ASSERT_EQ(il.deinterleaveAudio(view(copy, offset, copy.size() - offset), out), IL::eOk);
+    ASSERT_EQ(il.deinterleaveAudio(view(copy, offset), out), IL::eOk);
     EXPECT_EQ(copy, storage);
     EXPECT_EQ(out.sampleType, type == 5 ? 2 : 1);
     expectBlocks(out, expected, groups, k.bytes);
@@ -326,8 +314,7 @@ TEST(AudioInterleaver, SplitsEveryLayoutAtEveryLevel) {
                                {0, 4, 3, true},  {0, 4, 4, false}, {0, 4, 4, true}};
   for (SplitCase k : layouts)
     for (k.channels = 2; k.channels <= 8; ++k.channels)
-      for (std::size_t groups :
-           {0, 1, 2, 3, 7, 8, 9, 15, 16, 17, 31, 32, 33, 47, 63, 64, 65, 95, 96, 97, 161})
+      for (std::size_t groups : {0, 1, 3, 7, 8, 9, 15, 16, 17, 31, 32, 33, 63, 64, 65, 97, 161})
         for (std::size_t offset : {0, 3}) checkSplit(k, groups, offset, ++seed);
 }
 
@@ -338,16 +325,14 @@ TEST(AudioInterleaver, ReusesOnlyBlocksWithRoomForTheResult) {
   Bytes data = randomBytes(2 * 2 * 16, 11);
   const std::vector<Bytes> expected = expectedBlocks(data.data(), 16, 2, 2, 2, false, false);
   const IL il(1, 2, Aud::eDataTypePCM);
-  struct Row {
+  const struct {
     std::vector<std::size_t> bytes;  // memory of each block; 0 for none
     uint32_t samples;
     bool aliasSource, reused;
-  };
-  const Row rows[] = {{{}, 16, false, false},       {{32, 32, 32}, 16, false, false},
-                      {{32, 32}, 15, false, false}, {{0, 0}, 16, false, false},
-                      {{32, 31}, 16, false, false}, {{1, 32}, 16, false, false},
-                      {{32, 32}, 16, true, false},  {{32, 40}, 16, false, true}};
-  for (const Row& row : rows) {
+  } rows[] = {{{}, 16, false, false},      {{32, 32, 32}, 16, false, false}, {{32, 32}, 15, false, false},
+              {{0, 0}, 16, false, false},  {{32, 31}, 16, false, false},     {{1, 32}, 16, false, false},
+              {{32, 32}, 16, true, false}, {{32, 40}, 16, false, true}};
+  for (const auto& row : rows) {
     SCOPED_TRACE(&row - rows);
     Aud::StreamBufferList out;
     out.numSamples = row.samples;
@@ -355,12 +340,12 @@ TEST(AudioInterleaver, ReusesOnlyBlocksWithRoomForTheResult) {
     for (std::size_t bytes : row.bytes) {
       Aud::StreamBuffer block(0, row.samples, 1);
       if (bytes) block.buffer = Kv::Ptr<iMemHolder>(new ByteBufferImpl(bytes));
-      if (row.aliasSource) block.buffer = view(data, 0, data.size());
+      if (row.aliasSource) block.buffer = view(data);
       block.valid = true;
       out.buffers.push_back(block);
     }
     const Aud::StreamBufferList callers = out;
-    ASSERT_EQ(il.deinterleaveAudio(view(data, 0, data.size()), out), IL::eOk);
+    ASSERT_EQ(il.deinterleaveAudio(view(data), out), IL::eOk);
     for (std::size_t c = 0; c < 2 && c < callers.buffers.size(); ++c)
       EXPECT_EQ(out.buffers[c].buffer == callers.buffers[c].buffer, row.reused) << c;
     expectBlocks(out, expected, 16, 2);
@@ -397,8 +382,7 @@ TEST(AudioInterleaver, ExportFastPathsMatchTheReference) {
         const std::size_t need = std::size_t(samples) * channels * Aud::bytesPerSampleOfType(type);
         Bytes reference;
         for (eLevel level : levels()) {
-          SCOPED_TRACE(::testing::Message() << Aud::Simd::levelName(level) << ", type " << type << ", "
-                                            << channels << " channels, " << samples << " samples");
+          SCOPED_TRACE(::testing::Message() << Aud::Simd::levelName(level) << " seed " << seed);
           Aud::Simd::setActiveLevel(level);
           IL il(type, channels, Aud::eDataTypePCM);
           ASSERT_EQ(il.writeSamplesPlanar(pointers, samples), IL::eOk);
@@ -423,11 +407,10 @@ TEST(AudioInterleaver, ExportPassesSamplesThroughTheirRules) {
   const uint32_t nanBits = 0x7FC01234;
   float nanWithPayload;
   std::memcpy(&nanWithPayload, &nanBits, 4);
-  struct Row {
+  const struct {
     int type;
     Bytes left, right, interleaved;
-  };
-  const Row rows[] = {
+  } rows[] = {
       {1, asBytes<int16_t>({32767, 5}), asBytes<int16_t>({-32768, -1}),
        asBytes<int16_t>({32767, -32768, 5, -1})},
       {4, {255, 128}, {0, 1}, {254, 0, 127, 0}},
@@ -444,7 +427,7 @@ TEST(AudioInterleaver, ExportPassesSamplesThroughTheirRules) {
        asBytes<int32_t>({2147483647, 0, -2147483647 - 1, 0})},
   };
   RestoreLevel restore;
-  for (const Row& row : rows) {
+  for (const auto& row : rows) {
     for (eLevel level : levels()) {
       Aud::Simd::setActiveLevel(level);
       IL il(row.type, 2, Aud::eDataTypePCM);
@@ -480,28 +463,6 @@ TEST(AudioInterleaver, ExportRefusalsAreRecorded) {
     EXPECT_EQ(il.getLastError(), Status(row.status));
     EXPECT_EQ(il.getOutputBuffer(), nullptr);
   }
-}
-
-TEST(AudioInterleaver, OutputBufferGrowsAndNeverShrinks) {
-  IL il(1, 2, Aud::eDataTypePCM);
-  const Bytes big = randomBytes(2000, 3), small = randomBytes(20, 4);
-  ASSERT_EQ(il.writeSamplesPlanar({big.data(), big.data()}, 1000), IL::eOk);
-  const unsigned char* buffer = il.getOutputBuffer();
-  EXPECT_EQ(il.getOutputBufferSize(), 4000u);
-  ASSERT_EQ(il.writeSamplesPlanar({small.data(), small.data()}, 10), IL::eOk);
-  EXPECT_EQ(il.getOutputBuffer(), buffer);
-  EXPECT_EQ(il.getOutputBufferSize(), 4000u);
-  EXPECT_EQ(0, std::memcmp(buffer, small.data(), 2));
-  EXPECT_EQ(0, std::memcmp(buffer + 2, small.data(), 2));
-
-  // An unknown sample type writes nothing, logs, and is no error.
-  std::string logged;
-  host::setLogSink([&](const char* text) { logged += text; });
-  IL unknown = with(format(2, 2, 16, false, 9));
-  EXPECT_EQ(unknown.writeSamplesPlanar({small.data(), small.data()}, 4), IL::eOk);
-  host::setLogSink({});
-  EXPECT_NE(logged.find("WavExport: Mixer buffer sample format not supported!"), std::string::npos);
-  EXPECT_EQ(unknown.getOutputBufferSize(), 16u);
 }
 
 }  // namespace
