@@ -322,20 +322,16 @@ Store::iterator Store::erase(iterator first, iterator last) {
   return at(eraseRange(first.position_, last.position_, true));
 }
 
-Store::iterator Store::erase(double t1, double t2) {
-  CriticalSectionLock hold(lock_);
-  setModified();
-  const Pos last = lowerBound(t2);
-  if (!(t1 <= t2)) return at(last);
-  return at(eraseRange(lowerBound(t1), last, true));
-}
+Store::iterator Store::erase(double t1, double t2) { return eraseTimes(t1, t2, true); }
 
-Store::iterator Store::erase_noAdjust(double t1, double t2) {
+Store::iterator Store::erase_noAdjust(double t1, double t2) { return eraseTimes(t1, t2, false); }
+
+Store::iterator Store::eraseTimes(double t1, double t2, bool adjust) {
   CriticalSectionLock hold(lock_);
   setModified();
   const Pos last = lowerBound(t2);
   if (!(t1 <= t2)) return at(last);
-  return at(eraseRange(lowerBound(t1), last, false));
+  return at(eraseRange(lowerBound(t1), last, adjust));
 }
 
 Store::iterator Store::eraseNonGuard(iterator first, iterator last) {

@@ -206,6 +206,8 @@ class TONEBITS_API Store {
   Pos lowerBound(double t) const { return nodes_.lower_bound(Node(t)); }
   Pos insertWithoutAdjust(const Node& n);
   Pos eraseRange(Pos first, Pos last, bool adjust);
+  // The nodes from t1 up to t2, under the lock; none when t1 > t2 or a time is NaN.
+  iterator eraseTimes(double t1, double t2, bool adjust);
   void adjustAfterRangeErase(Pos r);
   Pos eraseOne(Pos it, bool adjust);
   bool reaches(Pos first, Pos last) const;
